@@ -1,0 +1,29 @@
+#include "platform/variable_length.h"
+
+#include <bit>
+
+namespace vemo {
+
+std::size_t VariableLengthBytes(std::uint8_t first) noexcept {
+  return 1u + static_cast<std::size_t>(std::countl_one(first));
+}
+
+std::uint8_t* SerialiseVariableLengthUint64(std::uint8_t* p, std::uint64_t value) noexcept {
+  const auto bits = static_cast<unsigned>(std::bit_width(value));
+  const unsigned following = bits > 56 ? 8 : bits <= 7 ? 0 : (bits - 1) / 7;
+  const unsigned prefix = 0xFF00u >> following & 0xFFu;
+  const std::uint64_t top = following >= 8 ? 0 : value >> (8 * following);
+  *p++ = static_cast<std::uint8_t>(prefix | top);
+  for (unsigned i = following; i-- > 0;) *p++ = static_cast<std::uint8_t>(value >> (8 * i));
+  return p;
+}
+
+const std::uint8_t* DeserialiseVariableLengthUint64(const std::uint8_t* p, std::uint64_t& value) noexcept {
+  const std::size_t following = VariableLengthBytes(*p) - 1;
+  std::uint64_t x = following >= 7 ? 0 : *p & (0x7Fu >> following);
+  for (std::size_t i = 1; i <= following; ++i) x = x << 8 | p[i];
+  value = x;
+  return p + 1 + following;
+}
+
+}  // namespace vemo

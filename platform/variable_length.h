@@ -1,0 +1,82 @@
+// The variable-length form of unsigned integers.
+//
+// The number of leading one bits of the first byte is the number of bytes that follow (a prefix code, so that the
+// length is known after one byte and decoding needs no loop over continuation bits); the value lies big-endian in the
+// remaining bits:
+//
+//   0xxxxxxx                                     7 bits
+//   10xxxxxx + 1 byte                           14 bits
+//   110xxxxx + 2 bytes                          21 bits
+//   1110xxxx + 3 bytes                          28 bits
+//   11110xxx + 4 bytes                          35 bits (a 32-bit value has xxx = 000)
+//   ... up to 11111111 + 8 bytes                64 bits
+//
+// Writers use the shortest form.
+#pragma once
+
+#include <cstddef>
+#include <cstdint>
+
+namespace vemo {
+
+inline constexpr std::size_t MAX_VARIABLE_LENGTH_UINT_SIZE = 5;
+inline constexpr std::size_t kMaxVariableLengthUint64Bytes = 9;
+
+// Writes `value` at `p` (1 to 5 bytes) and returns the pointer after it.
+inline std::uint8_t* SerialiseVariableLengthUint32(std::uint8_t* p, std::uint32_t value) noexcept {
+  if (value < 0x80u) {
+    *p++ = static_cast<std::uint8_t>(value);
+  } else if (value < 0x4000u) {
+    *p++ = static_cast<std::uint8_t>(0x80u | value >> 8);
+    *p++ = static_cast<std::uint8_t>(value);
+  } else if (value < 0x200000u) {
+    *p++ = static_cast<std::uint8_t>(0xC0u | value >> 16);
+    *p++ = static_cast<std::uint8_t>(value >> 8);
+    *p++ = static_cast<std::uint8_t>(value);
+  } else if (value < 0x10000000u) {
+    *p++ = static_cast<std::uint8_t>(0xE0u | value >> 24);
+    *p++ = static_cast<std::uint8_t>(value >> 16);
+    *p++ = static_cast<std::uint8_t>(value >> 8);
+    *p++ = static_cast<std::uint8_t>(value);
+  } else {
+    *p++ = 0xF0u;
+    *p++ = static_cast<std::uint8_t>(value >> 24);
+    *p++ = static_cast<std::uint8_t>(value >> 16);
+    *p++ = static_cast<std::uint8_t>(value >> 8);
+    *p++ = static_cast<std::uint8_t>(value);
+  }
+  return p;
+}
+
+// Reads at `p` and returns the pointer after the value. Trusts its input: at least the bytes that the first one
+// announces must be readable.
+inline const std::uint8_t* DeserialiseVariableLengthUint32(const std::uint8_t* p, std::uint32_t& value) noexcept {
+  const std::uint32_t first = p[0];
+  if (first < 0x80u) {
+    value = first;
+    return p + 1;
+  }
+  if (first < 0xC0u) {
+    value = (first & 0x3Fu) << 8 | p[1];
+    return p + 2;
+  }
+  if (first < 0xE0u) {
+    value = (first & 0x1Fu) << 16 | std::uint32_t{p[1]} << 8 | p[2];
+    return p + 3;
+  }
+  if (first < 0xF0u) {
+    value = (first & 0x0Fu) << 24 | std::uint32_t{p[1]} << 16 | std::uint32_t{p[2]} << 8 | p[3];
+    return p + 4;
+  }
+  value = std::uint32_t{p[1]} << 24 | std::uint32_t{p[2]} << 16 | std::uint32_t{p[3]} << 8 | p[4];
+  return p + 5;
+}
+
+// The same form for 64-bit values: 1 to 9 bytes.
+std::uint8_t* SerialiseVariableLengthUint64(std::uint8_t* p, std::uint64_t value) noexcept;
+const std::uint8_t* DeserialiseVariableLengthUint64(const std::uint8_t* p, std::uint64_t& value) noexcept;
+
+// The length in bytes of the form whose first byte is `first`: 1 to 9.
+std::size_t VariableLengthBytes(std::uint8_t first) noexcept;
+
+}  // namespace vemo

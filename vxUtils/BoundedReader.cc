@@ -1,0 +1,71 @@
+#include "vxUtils/BoundedReader.h"
+
+#include <cstring>
+#include <limits>
+
+#include "platform/variable_length.h"
+
+namespace vemo {
+
+std::uint64_t BoundedReader::ReadUint64() {
+  if (remaining() == 0) Fail("the bytes end where a number should begin");
+  const std::uint8_t* p = m_bytes.data() + m_offset;
+  const std::size_t length = VariableLengthBytes(*p);
+  if (length > remaining()) Fail("the bytes end inside a number");
+  std::uint64_t value = 0;
+  DeserialiseVariableLengthUint64(p, value);
+  std::uint8_t shortest[kMaxVariableLengthUint64Bytes];
+  if (SerialiseVariableLengthUint64(shortest, value) != shortest + length) Fail("a number is not in its shortest form");
+  m_offset += length;
+  return value;
+}
+
+std::uint32_t BoundedReader::ReadUint32() {
+  const std::size_t start = m_offset;
+  const std::uint64_t value = ReadUint64();
+  if (value > std::numeric_limits<std::uint32_t>::max()) {
+    m_offset = start;
+    Fail("a number has more than 32 bits");
+  }
+  return static_cast<std::uint32_t>(value);
+}
+
+std::uint32_t BoundedReader::ReadCount(std::size_t minBytesEach) {
+  const std::size_t start = m_offset;
+  const std::uint32_t count = ReadUint32();
+  if (count > remaining() / minBytesEach) {
+    m_offset = start;
+    Fail("the count " + std::to_string(count) + " is more than the bytes can hold");
+  }
+  return count;
+}
+
+void BoundedReader::ReadSchema(std::uint32_t currentSchema) {
+  const std::size_t start = m_offset;
+  const std::uint32_t schema = ReadUint32();
+  if (schema == 0 || schema > currentSchema) {
+    m_offset = start;
+    Fail("schema " + std::to_string(schema) + " is not one of 1 to " + std::to_string(currentSchema));
+  }
+}
+
+Guid BoundedReader::ReadGuid() {
+  if (remaining() < sizeof(Guid)) Fail("the bytes end inside a Guid");
+  Guid guid;
+  std::memcpy(&guid, m_bytes.data() + m_offset, sizeof(Guid));
+  m_offset += sizeof(Guid);
+  return guid;
+}
+
+FieldId BoundedReader::ReadFieldId() {
+  FieldId field;
+  field.oid = OID(ReadUint64());
+  for (Path::Element& element : field.path.Resize(ReadCount(1))) element = ReadUint32();
+  return field;
+}
+
+void BoundedReader::ExpectEnd() const {
+  if (remaining() != 0) Fail("the record should end here");
+}
+
+}  // namespace vemo

@@ -1,0 +1,48 @@
+// The checked counterpart of InputArchive, for bytes that nobody vouches for.
+#pragma once
+
+#include <cstdint>
+#include <span>
+
+#include "platform/error.h"
+#include "platform/field_id.h"
+#include "platform/guid.h"
+#include "platform/types.h"
+
+namespace vemo {
+
+// Walks a record without building anything. Every type that can be read from an InputArchive has a `CheckForm(reader,
+// const T*)` beside its `Deserialise`; bytes that CheckForm accepts are bytes on which Deserialise neither reads past
+// the end nor fails an assertion. Each function throws MalformedBytes with the offset of what does not fit. Nothing is
+// allocated by what the bytes claim, so hostile counts cost nothing.
+class BoundedReader {
+ public:
+  explicit BoundedReader(std::span<const std::uint8_t> bytes) noexcept : m_bytes(bytes) {}
+
+  std::size_t offset() const noexcept { return m_offset; }
+  std::size_t remaining() const noexcept { return m_bytes.size() - m_offset; }
+
+  // Variable-length values; a form that is longer than its value needs is refused.
+  std::uint32_t ReadUint32();
+  std::uint64_t ReadUint64();
+
+  // A count of items that take at least `minBytesEach` bytes each.
+  std::uint32_t ReadCount(std::size_t minBytesEach);
+
+  void ReadSchema(std::uint32_t currentSchema);
+  Guid ReadGuid();
+  FieldId ReadFieldId();
+
+  void ExpectEnd() const;
+  [[noreturn]] void Fail(const std::string& reason) const { throw MalformedBytes(m_offset, reason); }
+
+ private:
+  std::span<const std::uint8_t> m_bytes;
+  std::size_t m_offset = 0;
+};
+
+inline void CheckForm(BoundedReader& reader, const Guid*) { reader.ReadGuid(); }
+inline void CheckForm(BoundedReader& reader, const FieldId*) { reader.ReadFieldId(); }
+inline void CheckForm(BoundedReader& reader, const OID*) { reader.ReadUint64(); }
+
+}  // namespace vemo
