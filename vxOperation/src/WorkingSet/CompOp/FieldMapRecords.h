@@ -1,0 +1,232 @@
+// The records of maps and nodes: bodies of the functions that FieldMap.h and FieldMapNodes.h declare, and the checks that
+// bytes from outside pass before these readers, which trust their input, see them.
+//
+//   map        schema, number of entries, first leaf, last leaf, root, height + 1
+//   internal   schema, leftmost child, n, n x (key, child to its right)
+//   leaf       schema, previous leaf, next leaf, n, n x (key, payload)
+//
+// No record tells the class of its children: that follows from the map's height.
+#pragma once
+
+#include <memory>
+#include <string>
+#include <utility>
+
+#include "vxOperation/src/WorkingSet/CompOp/FieldMap.h"
+#include "platform/assertion.h"
+#include "vxUtils/Archive.h"
+#include "vxUtils/BoundedReader.h"
+
+namespace vemo {
+
+// --- Maps ---
+
+template <class Traits>
+void TFieldMap<Traits>::Serialise(Archive& ar) const {
+  SerialiseSchema(ar, Traits::kMapSchema);
+  SerialiseVariableLengthUint(ar, m_size);
+  ar << m_firstLeaf << m_lastLeaf << m_root;
+  SerialiseVariableLengthUint(ar, m_height + 1);
+}
+
+template <class Traits>
+void TFieldMap<Traits>::Deserialise(InputArchive& ar) {
+  int schema = 0;
+  DeserialiseSchema(ar, Traits::kMapSchema, schema);
+  DeserialiseVariableLengthUint(ar, m_size);
+  ar >> m_firstLeaf >> m_lastLeaf >> m_root;
+  DeserialiseVariableLengthUint(ar, m_height);
+  --m_height;
+  VEMO_ASSERT(m_size >= 0);
+  VEMO_ASSERT(m_height >= -1);
+}
+
+template <class Traits>
+void TFieldMap<Traits>::VisitObjects(IObjectVisitor& visitor) const {
+  visitor << m_firstLeaf << m_lastLeaf << m_root;
+}
+
+// The owning links alone: the leaves are the tree's, the first and last leaf are short cuts.
+template <class Traits>
+void TFieldMap<Traits>::VisitPrefs(IPrefVisitor& visitor) const {
+  visitor << m_root;
+}
+
+// --- Internal nodes ---
+
+template <class Traits>
+void TFieldMapInternalNode<Traits>::Serialise(Archive& ar) const {
+  SerialiseSchema(ar, Traits::kInternalNodeSchema);
+  ar << m_ptr;
+  SerialiseVariableLengthUint(ar, m_numKeyEntrys);
+  for (ssize_t i = 0; i < m_numKeyEntrys; ++i) ar << GetEntry(i).m_key << GetEntry(i).m_ptr;
+}
+
+template <class Traits>
+void TFieldMapInternalNode<Traits>::Deserialise(InputArchive& ar) {
+  int schema = 0;
+  DeserialiseSchema(ar, Traits::kInternalNodeSchema, schema);
+  ar >> m_ptr;
+  ssize_t n = 0;
+  DeserialiseVariableLengthUint(ar, n);
+  VEMO_ASSERT_TEXT(0 <= n && n <= Traits::kCapacity, "0 <= n && n <= 100");
+  ResizeArrayElements(m_entrys.Slot(0), m_numKeyEntrys, n);
+  m_numKeyEntrys = n;
+  for (ssize_t i = 0; i < n; ++i) ar >> GetEntry(i).m_key >> GetEntry(i).m_ptr;
+}
+
+template <class Traits>
+void TFieldMapInternalNode<Traits>::VisitObjects(IObjectVisitor& visitor) const {
+  visitor << m_ptr;
+  for (ssize_t i = 0; i < m_numKeyEntrys; ++i) visitor << GetEntry(i).m_ptr;
+}
+
+template <class Traits>
+void TFieldMapInternalNode<Traits>::VisitPrefs(IPrefVisitor& visitor) const {
+  visitor << m_ptr;
+  for (ssize_t i = 0; i < m_numKeyEntrys; ++i) visitor << GetEntry(i).m_ptr;
+}
+
+// --- Leaves ---
+
+template <class Traits>
+void TFieldMapLeafNode<Traits>::Serialise(Archive& ar) const {
+  SerialiseSchema(ar, Traits::kLeafNodeSchema);
+  ar << m_prev << m_next;
+  SerialiseVariableLengthUint(ar, m_numKeyEntrys);
+  for (ssize_t i = 0; i < m_numKeyEntrys; ++i) ar << GetEntry(i).first << GetEntry(i).second;
+}
+
+template <class Traits>
+void TFieldMapLeafNode<Traits>::Deserialise(InputArchive& ar) {
+  int schema = 0;
+  DeserialiseSchema(ar, Traits::kLeafNodeSchema, schema);
+  ar >> m_prev >> m_next;
+  ssize_t n = 0;
+  DeserialiseVariableLengthUint(ar, n);
+  VEMO_ASSERT_TEXT(0 <= n && n <= Traits::kCapacity, "0 <= n && n <= 100");
+  ResizeArrayElements(m_entrys.Slot(0), m_numKeyEntrys, n);
+  m_numKeyEntrys = n;
+  for (ssize_t i = 0; i < n; ++i) {
+    FieldId key;
+    ar >> key;
+    // The key of an entry is constant, so it is replaced rather than assigned.
+    const FieldId* place = &GetEntry(i).first;
+    std::destroy_at(place);
+    ::new (const_cast<void*>(static_cast<const void*>(place))) FieldId(std::move(key));
+    ar >> GetEntry(i).second;
+  }
+}
+
+template <class Traits>
+void TFieldMapLeafNode<Traits>::VisitObjects(IObjectVisitor& visitor) const {
+  visitor << m_prev << m_next;
+}
+
+// --- Checks of records from outside ---
+
+// Reads an id that must not be null.
+inline void CheckChild(BoundedReader& reader) {
+  if (reader.ReadUint64() == 0) reader.Fail("a reference to a child is empty");
+}
+
+// Reads the next key of a node and sees that keys ascend.
+inline void CheckNextKey(BoundedReader& reader, FieldId& previous, bool first) {
+  FieldId key = reader.ReadFieldId();
+  if (!first && CompareKeys(previous, key) >= 0) reader.Fail("the keys of a node do not ascend");
+  previous = std::move(key);
+}
+
+inline std::uint32_t CheckNodeCount(BoundedReader& reader, std::uint32_t least, ssize_t capacity) {
+  const std::uint32_t n = reader.ReadUint32();
+  if (n < least || n > static_cast<std::uint64_t>(capacity)) {
+    reader.Fail("a node cannot hold " + std::to_string(n) + " entries");
+  }
+  return n;
+}
+
+template <class Traits>
+void CheckForm(BoundedReader& reader, const TFieldMap<Traits>*) {
+  constexpr std::uint32_t kMaxHeight = 64;  // a valid tree that high would not fit into any memory
+  reader.ReadSchema(Traits::kMapSchema);
+  const std::uint32_t size = reader.ReadUint32();
+  const bool first = reader.ReadUint64() != 0;
+  const bool last = reader.ReadUint64() != 0;
+  const bool root = reader.ReadUint64() != 0;
+  const std::uint32_t levels = reader.ReadUint32();
+  if (levels > kMaxHeight) reader.Fail("a map cannot have " + std::to_string(levels) + " levels");
+  if (first != (levels > 0) || last != first || root != first || (size > 0 && levels == 0)) {
+    reader.Fail("size, references and height of a map contradict one another");
+  }
+}
+
+template <class Traits>
+void CheckForm(BoundedReader& reader, const TFieldMapInternalNode<Traits>*) {
+  reader.ReadSchema(Traits::kInternalNodeSchema);
+  CheckChild(reader);
+  const std::uint32_t n = CheckNodeCount(reader, 1, Traits::kCapacity);
+  FieldId previous;
+  for (std::uint32_t i = 0; i < n; ++i) {
+    CheckNextKey(reader, previous, i == 0);
+    CheckChild(reader);
+  }
+}
+
+template <class Traits>
+void CheckForm(BoundedReader& reader, const TFieldMapLeafNode<Traits>*) {
+  reader.ReadSchema(Traits::kLeafNodeSchema);
+  const std::uint64_t prev = reader.ReadUint64();
+  const std::uint64_t next = reader.ReadUint64();
+  if (prev == next && prev != 0) reader.Fail("a leaf has the same neighbour on both sides");
+  const std::uint32_t n = CheckNodeCount(reader, 0, Traits::kCapacity);
+  FieldId previous;
+  for (std::uint32_t i = 0; i < n; ++i) {
+    CheckNextKey(reader, previous, i == 0);
+    CheckForm(reader, static_cast<const typename Traits::Payload*>(nullptr));
+  }
+}
+
+// --- The forms that ToBytes, FromBytes and ToText look for ---
+
+template <class T>
+concept FieldMapObject = requires(const T& object, T& target, Archive& ar, InputArchive& in) {
+  typename T::FinalClass;
+  object.Serialise(ar);
+  target.Deserialise(in);
+};
+
+template <FieldMapObject T>
+void Serialise(Archive& ar, const T& object) {
+  object.Serialise(ar);
+}
+template <FieldMapObject T>
+void Deserialise(InputArchive& ar, T& object) {
+  object.Deserialise(ar);
+}
+
+template <class Traits>
+xostream& operator<<(xostream& os, const TFieldMap<Traits>& map) {
+  map.Write(os);
+  return os;
+}
+
+// One node alone: children and neighbours are named by id and not loaded.
+template <class Traits>
+xostream& operator<<(xostream& os, const TFieldMapInternalNode<Traits>& node) {
+  os << "{child=" << std::to_string(node.m_ptr.m_oid.m_value) << '\n';
+  for (ssize_t i = 0; i < node.m_numKeyEntrys; ++i) {
+    os << node.GetEntry(i).m_key << " child=" << std::to_string(node.GetEntry(i).m_ptr.m_oid.m_value) << '\n';
+  }
+  return os << "}\n";
+}
+
+template <class Traits>
+xostream& operator<<(xostream& os, const TFieldMapLeafNode<Traits>& leaf) {
+  os << "{prev=" << std::to_string(leaf.m_prev.m_oid.m_value) << " next=" << std::to_string(leaf.m_next.m_oid.m_value) << '\n';
+  for (ssize_t i = 0; i < leaf.m_numKeyEntrys; ++i) {
+    os << leaf.GetEntry(i).first << " --> " << leaf.GetEntry(i).second << '\n';
+  }
+  return os << "}\n";
+}
+
+}  // namespace vemo
