@@ -2,6 +2,7 @@
 
 #include <cstring>
 #include <new>
+#include <utility>
 
 namespace vemo {
 
@@ -37,6 +38,12 @@ void VectorOfByte::erasebytes(ssize_t position, ssize_t count) noexcept {
   std::byte* gap = m_data + position;
   std::memmove(gap, gap + count, static_cast<std::size_t>(m_size - position - count));
   m_size -= count;
+}
+
+void VectorOfByte::swap(VectorOfByte& other) noexcept {
+  std::swap(m_data, other.m_data);
+  std::swap(m_size, other.m_size);
+  std::swap(m_capacity, other.m_capacity);
 }
 
 }  // namespace vemo

@@ -38,6 +38,9 @@ class VectorOfByte {
   // Removes the bytes [position, position + count).
   void erasebytes(ssize_t position, ssize_t count) noexcept;
 
+  // Exchanges contents and capacities.
+  void swap(VectorOfByte& other) noexcept;
+
  private:
   std::byte* m_data = nullptr;
   ssize_t m_size = 0;
