@@ -39,19 +39,24 @@ bool TFieldMap<Traits>::Delete(const FieldId& key) {
 
 template <class Traits>
 typename TFieldMap<Traits>::iterator TFieldMap<Traits>::erase(const_iterator position) {
+  MutationScope scope(this->GetThisAsFinalClass());
   const FieldId key = position->first;  // a copy: the entry is about to go
   Delete(key);
-  return iterator(static_cast<const IteratorPolicy&>(lower_bound(key)));
+  const const_iterator following = lower_bound(key);
+  scope.Complete();
+  return iterator(static_cast<const IteratorPolicy&>(following));
 }
 
 template <class Traits>
 typename TFieldMap<Traits>::iterator TFieldMap<Traits>::erase(const_iterator first, const_iterator last) {
+  MutationScope scope(this->GetThisAsFinalClass());
   if (last == cend()) {
     while (first != cend()) first = erase(first);
   } else {
     const FieldId bound = last->first;
     while (first->first < bound) first = erase(first);
   }
+  scope.Complete();
   return iterator(static_cast<const IteratorPolicy&>(first));
 }
 

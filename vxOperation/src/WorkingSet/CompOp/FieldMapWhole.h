@@ -16,8 +16,10 @@ TFieldMap<Traits>::TFieldMap(const TFieldMap& other) : TFieldMap() {
 
 template <class Traits>
 typename Traits::Map& TFieldMap<Traits>::operator=(const TFieldMap& other) {
+  MutationScope scope(this->GetThisAsFinalClass());
   TFieldMap copy(other);
   swap(copy);
+  scope.Complete();
   return *this->GetThisAsFinalClass();
 }
 

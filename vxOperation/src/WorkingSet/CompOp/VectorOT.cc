@@ -1,0 +1,21 @@
+#include "vxOperation/src/WorkingSet/CompOp/VectorOT.h"
+
+#include "vxOperation/src/WorkingSet/CompOp/FieldMapBodies.h"
+
+namespace vemo {
+
+template class TFieldMap<FieldIdToVectorInsertionsMapTraits>;
+template class TFieldMapInternalNode<FieldIdToVectorInsertionsMapTraits>;
+template class TFieldMapLeafNode<FieldIdToVectorInsertionsMapTraits>;
+template class TFieldMap<FieldIdToVectorTombstonesMapTraits>;
+template class TFieldMapInternalNode<FieldIdToVectorTombstonesMapTraits>;
+template class TFieldMapLeafNode<FieldIdToVectorTombstonesMapTraits>;
+template class TFieldMap<FieldIdToVectorInsertionsAndDeletionsMapTraits>;
+template class TFieldMapInternalNode<FieldIdToVectorInsertionsAndDeletionsMapTraits>;
+template class TFieldMapLeafNode<FieldIdToVectorInsertionsAndDeletionsMapTraits>;
+
+VEMO_FIELD_MAP_REGISTRATION(FieldIdToVectorInsertionsMap)
+VEMO_FIELD_MAP_REGISTRATION(FieldIdToVectorTombstonesMap)
+VEMO_FIELD_MAP_REGISTRATION(FieldIdToVectorInsertionsAndDeletionsMap)
+
+}  // namespace vemo
