@@ -1,0 +1,89 @@
+// An open LMDB environment that holds a space: its transactions, and its address space as it grows.
+//
+// 1. m_writing serialises write transactions, m_state guards the count of snapshots and the beginning of read
+//    transactions. Who takes both takes m_writing first.
+// 2. The environment handle and the map change only under both locks and while no snapshot is open: LMDB must
+// not remap
+//    or close under a transaction of this process. m_env is null only after a failed attempt to open it
+//    again.
+// 3. After fork the child never calls LMDB with this environment: not to close it either, which would release
+// the
+//    parent's reader slots.
+#pragma once
+
+#include <sys/types.h>
+
+#include <cstddef>
+#include <cstdint>
+#include <filesystem>
+#include <functional>
+#include <mutex>
+#include <optional>
+#include <string>
+
+#include "engines/lmdb/lmdb_engine.h"
+#include "engines/lmdb/lmdb_layout.h"
+#include "engines/lmdb/space_folder.h"
+
+struct MDB_env;
+
+namespace vemo {
+
+class LmdbEnvironment {
+ public:
+  explicit LmdbEnvironment(const LmdbOptions& options);
+  ~LmdbEnvironment();
+  LmdbEnvironment(const LmdbEnvironment&) = delete;
+  LmdbEnvironment& operator=(const LmdbEnvironment&) = delete;
+
+  const std::string& name() const noexcept { return m_name; }
+  const std::filesystem::path& path() const noexcept { return m_path; }
+  const LmdbTables& tables() const noexcept { return m_tables; }  // stable while a transaction is open
+
+  // Throws StoreError when the environment was opened by the process that forked this one.
+  void RequireOwnProcess(const char* operation) const;
+  // Throws StoreError when the space was opened read-only.
+  void RequireWritable(const char* operation) const;
+
+  // A read transaction of the newest commit, to be given back to EndSnapshot on any thread.
+  MDB_txn* BeginSnapshot();
+  void EndSnapshot(MDB_txn* txn) noexcept;
+
+  // Runs `change` in a write transaction and commits it; runs it again when the map had to grow. When it or
+  // the commit throws, nothing was applied.
+  void Write(const char* operation, const std::function<void(MDB_txn*)>& change);
+
+  // The number of records in the newest commit.
+  std::uint64_t CountRecords();
+
+ private:
+  bool IsOwnProcess() const noexcept;
+  void ProbeData() const;
+  void Open(std::size_t mapBytes);
+  void OpenFlexibly();
+  void Close() noexcept;
+  void OpenOrCreateTables();
+
+  // The functions below need m_state; those that change the map need m_writing as well.
+  int TryBeginRead(MDB_txn** txn);
+  MDB_txn* BeginReadOrRecover(const char* operation);
+  void Recover(int code, const char* operation);
+  void Grow(const char* operation);
+  void AdoptGrowth(const char* operation);
+  void RequireNoSnapshots(int code, const char* operation) const;
+
+  const LmdbOptions m_options;
+  const std::string m_name;
+  const std::filesystem::path m_path;
+  const pid_t m_process;
+  std::optional<FolderClaim> m_claim;
+
+  std::mutex m_writing;
+  std::mutex m_state;
+  MDB_env* m_env = nullptr;
+  LmdbTables m_tables;
+  std::size_t m_mapBytes = 0;
+  std::size_t m_openSnapshots = 0;
+};
+
+}  // namespace vemo
