@@ -1,0 +1,36 @@
+// The engines that the contract runs over.
+#include "engines/lmdb/lmdb_engine.h"
+#include "engines/memory/memory_engine.h"
+#include "tests/engines/engine_contract.h"
+#include "tests/support/temp_folder.h"
+
+namespace vemo::test {
+namespace {
+
+class MemorySite final : public EngineSite {
+ public:
+  std::unique_ptr<Engine> Open() override { return OpenMemoryEngine(); }
+};
+
+class LmdbSite final : public EngineSite {
+ public:
+  std::unique_ptr<Engine> Open() override {
+    LmdbOptions options;
+    options.path = m_folder.path() / "space";
+    options.create = true;
+    return OpenLmdbEngine(options);
+  }
+
+ private:
+  TempFolder m_folder;
+};
+
+}  // namespace
+
+const std::vector<EngineKind>& AllEngineKinds() {
+  static const std::vector<EngineKind> kinds{{"memory", false, [] { return std::make_unique<MemorySite>(); }},
+                                             {"lmdb", true, [] { return std::make_unique<LmdbSite>(); }}};
+  return kinds;
+}
+
+}  // namespace vemo::test
