@@ -125,9 +125,19 @@ bool RecordingHost::IsDeleted(const std::string& name) const {
   Die("no object is called " + name);
 }
 
+void RecordingHost::Write(Object& object) {
+  const bool known = !object.m_record.empty();
+  const bool clean = m_flagging && !SysState(object.m_object).GetFlag(ObjSysState::kDirtyFlag);
+  Bytes record = RecordOf(object.m_object);
+  if (known && clean && record != object.m_record) Fault(object.m_name + " changed without being marked");
+  object.m_record = std::move(record);
+  SysState(object.m_object).ClearFlag(ObjSysState::kDirtyFlag);
+}
+
 void RecordingHost::CleanAll() {
+  const ExemptAllocations exempt;
   for (auto& [id, object] : m_objects) {
-    if (object.m_object.m_self != nullptr) SysState(object.m_object).ClearFlag(ObjSysState::kDirtyFlag);
+    if (object.m_object.m_self != nullptr && !object.m_deleted) Write(object);
   }
 }
 
@@ -143,11 +153,10 @@ std::string RecordingHost::DirtyNames() const {
 
 void RecordingHost::UnloadAll() {
   const ExemptAllocations exempt;
+  CleanAll();
   for (auto& [id, object] : m_objects) {
     if (object.m_object.m_self == nullptr) continue;
-    if (!object.m_deleted) object.m_record = RecordOf(object.m_object);
     if (object.m_adopted) {
-      SysState(object.m_object).ClearFlag(ObjSysState::kDirtyFlag);
       InputArchive archive(object.m_record.data());
       object.m_object.Table()->Deserialise(object.m_object.m_self, archive);
     } else {

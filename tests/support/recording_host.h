@@ -53,11 +53,13 @@ class RecordingHost {
   bool IsDeleted(const std::string& name) const;
   std::size_t NumObjects() const { return m_objects.size(); }
 
-  // Clears all dirty flags, as a store does that has written everything.
+  // Writes every new and every dirty object and clears the dirty flags, as a store does at a commit. An
+  // object that changed since it was last written without being marked is a fault (while flags are set at
+  // all).
   void CleanAll();
   // The names of the dirty objects, in the order of their ids, with blanks between.
   std::string DirtyNames() const;
-  // Writes every object, drops all that the host owns from memory and unbinds the references of adopted ones:
+  // As CleanAll; then drops all that the host owns from memory and unbinds the references of adopted objects:
   // whatever is used next is made anew from its record. Pointers to nodes end here.
   void UnloadAll();
 
@@ -102,7 +104,7 @@ class RecordingHost {
     std::string m_name;
     bool m_adopted = false;
     bool m_deleted = false;
-    Bytes m_record;
+    Bytes m_record;  // empty until it is first written
   };
 
   static ObjSysState& SysState(ptr<IPersistable> object);
@@ -111,6 +113,7 @@ class RecordingHost {
   void CountCall(const std::string& text);
   static void DestroyObject(Object& object);
   void Load(OID id, Object& object);
+  void Write(Object& object);
 
   CallLog m_log;
   std::map<OID, Object> m_objects;
