@@ -1,0 +1,93 @@
+#include "store/snapshot.h"
+
+#include "platform/error.h"
+#include "store/envelope.h"
+
+namespace vemo {
+
+namespace {
+
+std::string_view AsText(ByteView bytes) { return {reinterpret_cast<const char*>(bytes.data()), bytes.size()}; }
+
+std::string_view OpenMeta(const std::string& spaceName, std::string_view name, ByteView sealed) {
+  try {
+    return AsText(OpenNamed(NamedTable::kMeta, name, sealed));
+  } catch (const MalformedBytes& malformed) {
+    throw CorruptRecord(spaceName + ": meta value \"" + std::string(name) + "\": " + malformed.what(), OID());
+  }
+}
+
+}  // namespace
+
+std::optional<std::string> ReadMeta(const EngineSnapshot& state, const std::string& spaceName, std::string_view name) {
+  const std::optional<ByteView> sealed = state.ReadNamed(NamedTable::kMeta, name);
+  if (!sealed) return std::nullopt;
+  return std::string(OpenMeta(spaceName, name, *sealed));
+}
+
+void ScanStoredMeta(const EngineSnapshot& state, const std::string& spaceName, std::string_view prefix,
+                    const std::function<bool(std::string_view, std::string_view)>& visit) {
+  state.ScanNamed(NamedTable::kMeta, prefix, [&](std::string_view name, ByteView sealed) {
+    return visit(name, OpenMeta(spaceName, name, sealed));
+  });
+}
+
+Snapshot::Snapshot(CSpace& space) : m_space(space), m_view(space, space.m_engine->Name(), View::Kind::kSnapshot) {
+  m_view.Attach(space.m_engine->OpenSnapshot());
+  const std::lock_guard lock(space.m_snapshotsMutex);
+  space.m_snapshots.insert(this);
+}
+
+Snapshot::~Snapshot() {
+  const std::lock_guard lock(m_space.m_snapshotsMutex);
+  m_space.m_snapshots.erase(this);
+}
+
+ptr<IPersistable> Snapshot::RootMap(std::string_view name) {
+  const View::Root* root = m_view.FindRoot(name);
+  if (root == nullptr) throw UsageError(m_space.Name() + ": it has no root map \"" + std::string(name) + "\"");
+  return root->map;
+}
+
+void Snapshot::RefuseRoot(std::string_view name, const IPersistable::FnTable* table) {
+  throw UsageError(m_space.Name() + ": root \"" + std::string(name) + "\" is a " +
+                   std::string(m_view.FindRoot(name)->classEntry->Name()) + ", not a " +
+                   std::string(FindClass(table)->Name()));
+}
+
+bool Snapshot::HasRoot(std::string_view name) const {
+  return m_view.State().ReadNamed(NamedTable::kRoots, name).has_value();
+}
+
+std::vector<std::string> Snapshot::RootNames() const {
+  std::vector<std::string> names;
+  m_view.State().ScanNamed(NamedTable::kRoots, "", [&](std::string_view name, ByteView) {
+    if (name.front() != '\0') names.emplace_back(name);
+    return true;
+  });
+  return names;
+}
+
+std::optional<std::string> Snapshot::Meta(std::string_view name) const {
+  return ReadMeta(m_view.State(), m_space.Name(), name);
+}
+
+void Snapshot::ScanMeta(std::string_view prefix,
+                        const std::function<bool(std::string_view, std::string_view)>& visit) const {
+  ScanStoredMeta(m_view.State(), m_space.Name(), prefix, visit);
+}
+
+void Snapshot::ForgetIfHolds(ptr<const IPersistable> object) noexcept {
+  const OID oid = PersistStateOf(object).m_oid;
+  bool holds = m_view.Find(oid).m_self == object.m_self;
+  for (const auto& [name, root] : m_view.Roots()) holds = holds || root.map.m_self == object.m_self;
+  if (!holds) return;
+  m_view.ForgetResidents();
+  try {
+    m_view.ReloadRoots();
+  } catch (const std::exception&) {
+    // The roots stay stale, and whoever asks for one next gets the exception.
+  }
+}
+
+}  // namespace vemo

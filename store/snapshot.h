@@ -1,0 +1,61 @@
+// Reading a space as it was after one commit.
+#pragma once
+
+#include <functional>
+#include <optional>
+#include <string>
+#include <string_view>
+#include <vector>
+
+#include "store/space.h"
+
+namespace vemo {
+
+// Sees the newest commit at the time of its construction for as long as it lives, whatever is committed meanwhile, and
+// blocks nobody. Any number may be open; each is used by one thread at a time. Maps, iterators and payload pointers taken
+// from it end with it. Loaded nodes are its own and stay in memory until then.
+class Snapshot {
+ public:
+  explicit Snapshot(CSpace& space);
+  ~Snapshot();
+  Snapshot(const Snapshot&) = delete;
+  Snapshot& operator=(const Snapshot&) = delete;
+
+  // The root map of that name; throws UsageError when there is none or when it is of another class.
+  template <class Map>
+  const Map& Root(std::string_view name) {
+    const ptr<IPersistable> map = RootMap(name);
+    if (map.Table() != IPersistable::Stubs<Map>::GetTable()) RefuseRoot(name, IPersistable::Stubs<Map>::GetTable());
+    return *static_cast<const Map*>(map.m_self);
+  }
+
+  // The root map of that name, whatever its class. Throws UsageError when there is none.
+  ptr<IPersistable> RootMap(std::string_view name);
+  bool HasRoot(std::string_view name) const;
+  // All named roots, in order.
+  std::vector<std::string> RootNames() const;
+
+  std::optional<std::string> Meta(std::string_view name) const;
+  void ScanMeta(std::string_view prefix,
+                const std::function<bool(std::string_view name, std::string_view value)>& visit) const;
+
+  // The number of commits that the space has had.
+  std::uint64_t Generation() const noexcept { return m_view.Generation(); }
+  View& Objects() noexcept { return m_view; }
+
+  // Forgets the view's objects if `object` is one of them.
+  void ForgetIfHolds(ptr<const IPersistable> object) noexcept;
+
+ private:
+  [[noreturn]] void RefuseRoot(std::string_view name, const IPersistable::FnTable* table);
+
+  CSpace& m_space;
+  View m_view;
+};
+
+// Reading small named values from an engine's state.
+std::optional<std::string> ReadMeta(const EngineSnapshot& state, const std::string& spaceName, std::string_view name);
+void ScanStoredMeta(const EngineSnapshot& state, const std::string& spaceName, std::string_view prefix,
+                    const std::function<bool(std::string_view name, std::string_view value)>& visit);
+
+}  // namespace vemo

@@ -1,0 +1,120 @@
+#include "store/space.h"
+
+#include <algorithm>
+#include <cstring>
+
+#include "engines/lmdb/lmdb_engine.h"
+#include "engines/memory/memory_engine.h"
+#include "platform/assertion.h"
+#include "platform/variable_length.h"
+#include "store/envelope.h"
+#include "store/snapshot.h"
+#include "store/transaction.h"
+#include "store/uri.h"
+
+namespace vemo {
+
+namespace {
+
+constexpr std::string_view kFormatName = "format";
+constexpr std::uint32_t kSpaceFormat = 1;
+constexpr std::uint64_t kMaxIdRange = 65'536;
+
+std::unique_ptr<Engine> OpenEngine(const SpaceUri& uri, bool create) {
+  if (uri.engine == SpaceUri::Engine::kMemory) return OpenMemoryEngine();
+  LmdbOptions options;
+  options.path = uri.path;
+  options.create = create;
+  options.mapBytes = uri.mapBytes;
+  options.syncEachCommit = uri.syncEachCommit;
+  return OpenLmdbEngine(options);
+}
+
+}  // namespace
+
+std::unique_ptr<CSpace> CSpace::Open(std::string_view uri, const SpaceOptions& options) {
+  RegisterMapClasses();
+  const SpaceUri parsed = ParseSpaceUri(uri);
+  const bool create = options.create || parsed.engine == SpaceUri::Engine::kMemory;
+  std::unique_ptr<CSpace> space(new CSpace(SpaceUriText(parsed), OpenEngine(parsed, create), options));
+  space->CheckFormat(create);
+  return space;
+}
+
+CSpace::CSpace(std::string name, std::unique_ptr<Engine> engine, const SpaceOptions& options)
+    : m_name(std::move(name)),
+      m_engine(std::move(engine)),
+      m_options(options),
+      m_writerView(*this, m_engine->Name(), View::Kind::kWriter) {}
+
+CSpace::~CSpace() {
+  VEMO_ASSERT_TEXT(m_snapshots.empty(), "no snapshot is open when its space is closed");
+  VEMO_ASSERT_TEXT(m_writerMutex.try_lock(), "no transaction is open when its space is closed");
+}
+
+std::string CSpace::OptionsText() const {
+  return m_name + " create=" + (m_options.create ? "yes" : "no") +
+         " writer_timeout_ms=" + std::to_string(m_options.writerTimeout.count());
+}
+
+// A new space gets its format number in its first commit; an older program must not touch a newer space.
+void CSpace::CheckFormat(bool create) {
+  const auto state = m_engine->OpenSnapshot();
+  const std::optional<ByteView> stored = state->ReadNamed(NamedTable::kInfo, kFormatName);
+  if (stored) {
+    std::uint32_t format = 0;
+    try {
+      BoundedReader reader(OpenNamed(NamedTable::kInfo, kFormatName, *stored));
+      format = reader.ReadUint32();
+    } catch (const MalformedBytes& malformed) {
+      throw CorruptRecord(m_engine->Name() + ": its format number is damaged: " + malformed.what(), OID());
+    }
+    if (format > kSpaceFormat) {
+      throw IncompatibleSpace(m_engine->Name() + ": written in format " + std::to_string(format) +
+                              " by a newer vemo; this one reads up to format " + std::to_string(kSpaceFormat));
+    }
+    return;
+  }
+  if (state->Generation() != 0) throw IncompatibleSpace(m_engine->Name() + ": it has commits but no format number");
+  if (!create) throw SpaceNotFound(m_engine->Name() + ": the space was never finished being made; open it for writing");
+  std::uint8_t number[MAX_VARIABLE_LENGTH_UINT_SIZE];
+  const Bytes value(number, SerialiseVariableLengthUint32(number, kSpaceFormat));
+  CommitBatch batch;
+  batch.namedValues.push_back(
+      {NamedTable::kInfo, std::string(kFormatName), SealNamed(NamedTable::kInfo, kFormatName, value)});
+  const auto lock = m_engine->LockWriter(m_options.writerTimeout);
+  if (m_engine->OpenSnapshot()->Generation() == 0) m_engine->Commit(batch);
+}
+
+OID CSpace::NextId() {
+  if (m_nextId == m_idLimit) {
+    m_nextId = m_engine->ReserveIds(m_nextIdRange).m_value;
+    m_idLimit = m_nextId + m_nextIdRange;
+    m_nextIdRange = std::min(m_nextIdRange * 2, kMaxIdRange);
+  }
+  return OID(m_nextId++);
+}
+
+void CSpace::RefuseMark(ptr<const IPersistable> object) {
+  const ObjSysState& state = SysStateOf(object);
+  const OID oid = PersistStateOf(object).m_oid;
+  const std::string_view className = FindClass(object.Table())->Name();
+  if (state.GetFlag(kSnapshotFlag)) {
+    const std::string message = m_writerView.Describe(oid, className, "it belongs to a snapshot, which cannot be changed");
+    const std::lock_guard lock(m_snapshotsMutex);
+    for (Snapshot* snapshot : m_snapshots) snapshot->ForgetIfHolds(object);
+    throw UsageError(message);
+  }
+  const std::string message = m_writerView.Describe(
+      oid, className,
+      oid.IsNull() ? "the root was never committed or is gone; ask the transaction for it again"
+                   : "it was changed outside a transaction of this thread; open a WriteTransaction first");
+  // What the change has left half-done must not be seen by the next transaction.
+  if (!WriteTransaction::IsOpenOnThisThread(*this) && m_writerMutex.try_lock()) {
+    m_writerView.ForgetResidents();
+    m_writerMutex.unlock();
+  }
+  throw UsageError(message);
+}
+
+}  // namespace vemo

@@ -1,0 +1,353 @@
+#include "store/transaction.h"
+
+#include <utility>
+
+#include "platform/error.h"
+#include "store/commit_builder.h"
+#include "store/envelope.h"
+#include "store/snapshot.h"
+
+namespace vemo {
+
+namespace {
+
+thread_local WriteTransaction* t_transaction = nullptr;
+
+// How many queued deletions a commit works off at most, so that no commit pays for a large map that was cleared before it.
+constexpr std::size_t kDeletionsPerCommit = 256;
+
+constexpr std::size_t kMaxNameBytes = 400;
+
+void CheckName(std::string_view what, std::string_view name) {
+  if (name.empty() || name.size() > kMaxNameBytes) {
+    throw UsageError("the name of a " + std::string(what) + " has 1 to " + std::to_string(kMaxNameBytes) + " bytes, not " +
+                     std::to_string(name.size()));
+  }
+}
+
+const ClassEntry& MapClass(const IPersistable::FnTable* table) {
+  const ClassEntry* entry = FindClass(table);
+  if (entry == nullptr || !entry->isMap) throw UsageError("only the three maps can be roots of a space");
+  return *entry;
+}
+
+}  // namespace
+
+WriteTransaction* WriteTransaction::OnThisThread() noexcept { return t_transaction; }
+
+bool WriteTransaction::IsOpenOnThisThread(const CSpace& space) noexcept {
+  return t_transaction != nullptr && &t_transaction->m_space == &space;
+}
+
+WriteTransaction::WriteTransaction(CSpace& space) : m_space(space) {
+  if (t_transaction != nullptr) {
+    throw UsageError(space.Name() + ": this thread has a transaction open; commit or end it before opening another");
+  }
+  m_processLock = std::unique_lock(space.m_writerMutex, space.m_options.writerTimeout);
+  if (!m_processLock.owns_lock()) {
+    throw SpaceBusy(space.Name() + ": another thread's transaction is still open; try again");
+  }
+  m_engineLock = space.m_engine->LockWriter(space.m_options.writerTimeout);
+  space.m_writerView.Attach(space.m_engine->OpenSnapshot());
+  m_open = true;
+  t_transaction = this;
+}
+
+WriteTransaction::~WriteTransaction() {
+  if (!m_open) return;
+  vemo::View& view = m_space.m_writerView;
+  if (HasChanges()) {
+    view.ForgetResidents();
+    try {
+      view.ReloadRoots();
+    } catch (const std::exception&) {
+      // The roots stay stale, and the next transaction reads them or throws.
+    }
+  }
+  Finish();
+}
+
+bool WriteTransaction::HasChanges() const noexcept {
+  if (m_poisoned || !m_dirty.empty() || !m_new.empty() || !m_deletedIds.empty() || !m_removedRoots.empty()) return true;
+  for (const auto& [name, root] : m_space.m_writerView.Roots()) {
+    if (!root.committed && !root.oid.IsNull()) return true;
+  }
+  return false;
+}
+
+// Ends what is on the way out and lets go of the locks.
+void WriteTransaction::Finish() noexcept {
+  for (const Deleted& deleted : m_deleted) DestroyObject(deleted.object);
+  m_deleted.clear();
+  m_space.m_writerView.Detach();
+  m_open = false;
+  t_transaction = nullptr;
+  m_engineLock.reset();
+  m_processLock.unlock();
+}
+
+void WriteTransaction::RequireOpen() const {
+  if (!m_open) throw UsageError(m_space.Name() + ": the transaction has ended; open another");
+}
+
+// --- Roots ---
+
+vemo::View::Root* WriteTransaction::FindRootOfClass(std::string_view name, const ClassEntry& classEntry) {
+  RequireOpen();
+  vemo::View::Root* root = m_space.m_writerView.FindRoot(name);
+  if (root != nullptr && root->classEntry != &classEntry) {
+    throw UsageError(m_space.Name() + ": root \"" + std::string(name) + "\" is a " +
+                     std::string(root->classEntry->Name()) + ", not a " + std::string(classEntry.Name()));
+  }
+  return root;
+}
+
+void* WriteTransaction::FindExistingRoot(std::string_view name, const IPersistable::FnTable* table) {
+  const vemo::View::Root* root = FindRootOfClass(name, MapClass(table));
+  if (root == nullptr) throw UsageError(m_space.Name() + ": it has no root map \"" + std::string(name) + "\"");
+  return root->map.m_self;
+}
+
+void* WriteTransaction::FindOrMakeRoot(std::string_view name, const IPersistable::FnTable* table) {
+  CheckName("root map", name);
+  if (name.front() == '\0') throw UsageError("the name of a root map cannot start with a zero byte");
+  const ClassEntry& classEntry = MapClass(table);
+  if (const vemo::View::Root* root = FindRootOfClass(name, classEntry)) return root->map.m_self;
+  return MakeRoot(name, classEntry);
+}
+
+void* WriteTransaction::MakeRoot(std::string_view name, const ClassEntry& classEntry) {
+  return m_space.m_writerView.AddRoot(name, classEntry, m_space.NextId()).map.m_self;
+}
+
+std::string WriteTransaction::OwnedRootName(OID oid) {
+  return std::string("\0owned/", 7) + std::to_string(oid.m_value);
+}
+
+void* WriteTransaction::MakeOwnedRoot(const IPersistable::FnTable* table) {
+  RequireOpen();
+  const OID oid = m_space.NextId();
+  return m_space.m_writerView.AddRoot(OwnedRootName(oid), MapClass(table), oid).map.m_self;
+}
+
+void WriteTransaction::RemoveOwnedRoot(OID oid) {
+  vemo::View::Root* root = m_space.m_writerView.FindRoot(OwnedRootName(oid));
+  if (root == nullptr) throw UsageError(m_space.Name() + ": object " + std::to_string(oid.m_value) + " is no owned map");
+  m_removedRoots.push_back({OwnedRootName(oid), oid, root->committed});
+  m_dirty.erase(oid);
+  SysStateOf(root->map).ClearFlag(ObjSysState::kDirtyFlag);
+  PersistStateOf(root->map).m_oid = OID();
+  root->oid = OID();
+}
+
+void WriteTransaction::AddRemovedRoots(CommitBatch& batch) const {
+  for (const RemovedRoot& root : m_removedRoots) {
+    if (!root.committed) continue;
+    batch.namedValues.push_back({NamedTable::kRoots, root.name, std::nullopt});
+    batch.removedRecords.push_back(root.oid);
+  }
+}
+
+// --- Meta ---
+
+void WriteTransaction::SetMeta(std::string_view name, std::string_view value) {
+  RequireOpen();
+  CheckName("meta value", name);
+  m_meta.insert_or_assign(std::string(name), std::string(value));
+}
+
+void WriteTransaction::EraseMeta(std::string_view name) {
+  RequireOpen();
+  CheckName("meta value", name);
+  m_meta.insert_or_assign(std::string(name), std::nullopt);
+}
+
+std::optional<std::string> WriteTransaction::Meta(std::string_view name) const {
+  RequireOpen();
+  const auto changed = m_meta.find(name);
+  if (changed != m_meta.end()) return changed->second;
+  return ReadMeta(m_space.m_writerView.State(), m_space.Name(), name);
+}
+
+void WriteTransaction::ScanMeta(std::string_view prefix,
+                                const std::function<bool(std::string_view, std::string_view)>& visit) const {
+  RequireOpen();
+  auto changed = m_meta.lower_bound(prefix);
+  bool goOn = true;
+  // Visits the changed values that come before `name`; returns whether `name` itself is one of them.
+  const auto visitChangedUpTo = [&](const std::optional<std::string_view>& name) {
+    while (goOn && changed != m_meta.end() && changed->first.starts_with(prefix) && (!name || changed->first <= *name)) {
+      const bool isName = name && changed->first == *name;
+      if (changed->second) goOn = visit(changed->first, *changed->second);
+      ++changed;
+      if (isName) return true;
+    }
+    return false;
+  };
+  ScanStoredMeta(m_space.m_writerView.State(), m_space.Name(), prefix,
+                 [&](std::string_view name, std::string_view value) {
+                   if (!visitChangedUpTo(name) && goOn) goOn = visit(name, value);
+                   return goOn;
+                 });
+  visitChangedUpTo(std::nullopt);
+}
+
+// --- What the module tells the store ---
+
+void WriteTransaction::RequireOwn(ptr<const IPersistable> object) const {
+  const ObjSysState& state = SysStateOf(object);
+  const OID oid = PersistStateOf(object).m_oid;
+  const char* reason = nullptr;
+  if (state.m_cspace != &m_space || state.GetFlag(kSnapshotFlag)) {
+    reason = "it belongs to another space or to a snapshot";
+  } else if (state.GetFlag(kDeletedFlag)) {
+    reason = "it was deleted in this transaction and cannot be changed any more";
+  } else if (oid.IsNull()) {
+    reason = "this root was never committed or is gone; ask the transaction for it by name again";
+  }
+  if (reason != nullptr) throw UsageError(m_space.m_writerView.Describe(oid, "", reason));
+}
+
+void WriteTransaction::TakeNewObject(ptr<IPersistable> object) {
+  OID oid;
+  try {
+    oid = m_space.NextId();
+    m_new.insert(oid);
+    m_space.m_writerView.Adopt(oid, object);
+  } catch (...) {
+    if (!oid.IsNull()) m_new.erase(oid);
+    DestroyObject(object);
+    throw;
+  }
+}
+
+void WriteTransaction::MarkDirty(ptr<const IPersistable> object) {
+  RequireOwn(object);
+  m_dirty.emplace(PersistStateOf(object).m_oid, ptr<IPersistable>(object.m_self, object.Table()));
+  SysStateOf(object).SetFlag(ObjSysState::kDirtyFlag);
+}
+
+void WriteTransaction::CheckReachable(ptr<const IPersistable> from, ptr<const IPersistable> to) const {
+  if (SysStateOf(from).m_cspace != nullptr) RequireOwn(from);
+  RequireOwn(to);
+}
+
+// Takes an object out of the space: at once out of what a commit writes, out of memory when the transaction ends.
+void WriteTransaction::DeleteObject(ptr<IPersistable> object) {
+  RequireOwn(object);
+  const OID oid = PersistStateOf(object).m_oid;
+  m_deleted.reserve(m_deleted.size() + 1);
+  m_deletedIds.insert(oid);
+  const bool hasRecord = m_new.erase(oid) == 0;
+  m_deleted.push_back({oid, object, hasRecord});
+  m_dirty.erase(oid);
+  m_space.m_writerView.Release(oid);
+  ObjSysState& state = SysStateOf(object);
+  state.ClearFlag(ObjSysState::kDirtyFlag);
+  state.SetFlag(kDeletedFlag);
+}
+
+// What is in memory is deleted now, since nodes there may be changed or new; what is not is clean, and its id is queued:
+// later commits delete it a slice at a time.
+void WriteTransaction::DeleteSubTree(ptr<IPersistable> root) {
+  std::vector<ptr<IPersistable>> pending{root};
+  while (!pending.empty()) {
+    const ptr<IPersistable> object = pending.back();
+    pending.pop_back();
+    for (const prefbase& child : OwnedReferences(object)) {
+      const ptr<IPersistable> resident = m_space.m_writerView.Find(child.m_oid);
+      if (resident.m_self != nullptr) {
+        pending.push_back(resident);
+      } else if (!m_deletedIds.contains(child.m_oid)) {
+        m_queuedDeletions.push_back(child.m_oid);
+      }
+    }
+    DeleteObject(object);
+  }
+}
+
+// --- Commit ---
+
+void WriteTransaction::Commit() {
+  RequireOpen();
+  if (m_poisoned) {
+    throw PoisonedTransaction(m_space.Name() +
+                              ": a change was interrupted half-way by an exception; abort this transaction and begin again");
+  }
+  vemo::View& view = m_space.m_writerView;
+  const std::size_t classesBefore = view.NumClassNumbers();
+  CommitBuilder builder(view, m_space, m_new, m_deletedIds);
+  CommitBatch& batch = builder.Batch();
+  try {
+    for (auto& [name, root] : view.Roots()) {
+      if (root.committed || root.oid.IsNull()) continue;
+      builder.Add(root.oid, root.map);
+      batch.namedValues.push_back(
+          {NamedTable::kRoots, name, EncodeRootValue(name, {std::string(root.classEntry->Name()), root.oid})});
+    }
+    for (const auto& [oid, object] : m_dirty) {
+      if (!m_new.contains(oid)) builder.Add(oid, object);
+    }
+    builder.SweepQueue(kDeletionsPerCommit);
+    for (const Deleted& deleted : m_deleted) {
+      if (deleted.hasRecord) batch.removedRecords.push_back(deleted.oid);
+    }
+    for (const OID oid : m_queuedDeletions) batch.queuedDeletions.push_back(oid);
+    for (const auto& [name, value] : m_meta) {
+      std::optional<Bytes> sealed;
+      if (value) {
+        const ByteView bytes(reinterpret_cast<const std::uint8_t*>(value->data()), value->size());
+        sealed = SealNamed(NamedTable::kMeta, name, bytes);
+      }
+      batch.namedValues.push_back({NamedTable::kMeta, name, std::move(sealed)});
+    }
+    AddRemovedRoots(batch);
+    builder.Finish();
+    std::uint64_t generation = view.Generation();
+    if (!batch.records.empty() || !batch.removedRecords.empty() || !batch.queuedDeletions.empty() ||
+        !batch.finishedDeletions.empty() || !batch.namedValues.empty()) {
+      view.Detach();  // an open state would keep the engine from growing
+      generation = m_space.m_engine->Commit(batch);
+    }
+    AfterCommit(generation, builder.Written());
+  } catch (...) {
+    view.TruncateClassNumbers(classesBefore);
+    Reattach();
+    throw;
+  }
+}
+
+// After a commit that failed: the transaction goes on where it was, unless the engine has moved under it.
+void WriteTransaction::Reattach() noexcept {
+  vemo::View& view = m_space.m_writerView;
+  if (view.IsAttached()) return;
+  try {
+    auto state = m_space.m_engine->OpenSnapshot();
+    if (state->Generation() == view.Generation()) {
+      view.Resume(std::move(state));
+      return;
+    }
+  } catch (const std::exception&) {
+    // Without a state to read from the transaction can only be aborted.
+  }
+  m_poisoned = true;
+}
+
+// The engine has said yes: what was written is clean, and what no root reaches is dropped.
+void WriteTransaction::AfterCommit(std::uint64_t generation, const std::unordered_set<OID>& written) noexcept {
+  vemo::View& view = m_space.m_writerView;
+  for (const auto& [oid, object] : m_dirty) SysStateOf(object).ClearFlag(ObjSysState::kDirtyFlag);
+  for (const OID oid : m_new) {
+    if (written.contains(oid)) continue;
+    const ptr<IPersistable> unreached = view.Find(oid);
+    view.Release(oid);
+    DestroyObject(unreached);
+  }
+  for (auto& [name, root] : view.Roots()) root.committed = !root.oid.IsNull();
+  m_dirty.clear();
+  m_new.clear();
+  view.Advance(generation);
+  Finish();
+}
+
+}  // namespace vemo

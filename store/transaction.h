@@ -1,0 +1,135 @@
+// The one transaction that may change a space.
+#pragma once
+
+#include <functional>
+#include <map>
+#include <memory>
+#include <mutex>
+#include <optional>
+#include <string>
+#include <string_view>
+#include <unordered_map>
+#include <unordered_set>
+#include <vector>
+
+#include "store/space.h"
+#include "vxPersistStore/pref.h"
+
+namespace vemo {
+
+// Holds the writer lock of its space, in this process and across processes, from the constructor until Commit or the
+// destructor, which aborts. Used by the thread that opened it; a thread has at most one open.
+//
+// Lifetimes: a root map keeps its address as long as the space is open; iterators and payload pointers end with the
+// transaction. Nodes of a map on the stack belong to the transaction that was open when they were made: what no root
+// reaches by the end is dropped, and the map must not be used any longer.
+class WriteTransaction {
+ public:
+  // Throws SpaceBusy when another transaction, of this process or another, does not end within the writer time-out, and
+  // UsageError when this thread has a transaction open.
+  explicit WriteTransaction(CSpace& space);
+  // Aborts unless committed: memory and disk are as after the last commit. Never throws.
+  ~WriteTransaction();
+  WriteTransaction(const WriteTransaction&) = delete;
+  WriteTransaction& operator=(const WriteTransaction&) = delete;
+
+  // The root map of that name (1 to 400 bytes, not starting with a zero byte), made empty if the space has none. Throws
+  // UsageError when it is of another class.
+  template <class Map>
+  Map& Root(std::string_view name) {
+    return *static_cast<Map*>(FindOrMakeRoot(name, IPersistable::Stubs<Map>::GetTable()));
+  }
+
+  // The same for reading alone: a constant map, so that nothing is marked. Throws UsageError when there is none.
+  template <class Map>
+  const Map& View(std::string_view name) {
+    return *static_cast<const Map*>(FindExistingRoot(name, IPersistable::Stubs<Map>::GetTable()));
+  }
+
+  // A root map without a name, known by its id: for maps that live longer than a transaction and are not to be found by
+  // name. Disown deletes it with all it holds.
+  template <class Map>
+  Map& Own() {
+    return *static_cast<Map*>(MakeOwnedRoot(IPersistable::Stubs<Map>::GetTable()));
+  }
+  template <class Map>
+  Map& Owned(OID oid) {
+    return *static_cast<Map*>(FindExistingRoot(OwnedRootName(oid), IPersistable::Stubs<Map>::GetTable()));
+  }
+  template <class Map>
+  void Disown(Map& map) {
+    const OID oid = map.GetPersistObjState().m_oid;
+    map.clear();
+    RemoveOwnedRoot(oid);
+  }
+
+  // Small named values of the user's own, committed with everything else. Names have 1 to 400 bytes.
+  void SetMeta(std::string_view name, std::string_view value);
+  void EraseMeta(std::string_view name);
+  std::optional<std::string> Meta(std::string_view name) const;
+  // Calls `visit` with each name that starts with `prefix`, in order, and its value, until it returns false.
+  void ScanMeta(std::string_view prefix,
+                const std::function<bool(std::string_view name, std::string_view value)>& visit) const;
+
+  // Writes what changed as one atomic, durable commit, and ends the transaction. Throws PoisonedTransaction when a change
+  // was interrupted half-way, UsageError when an object refers to a deleted one or into another space, and StoreError
+  // when the engine fails; the transaction then stays open, to be tried again or aborted. Costs a record per changed
+  // object.
+  void Commit();
+
+  bool IsPoisoned() const noexcept { return m_poisoned; }
+
+  // Of the host's side:
+  static bool IsOpenOnThisThread(const CSpace& space) noexcept;
+  static WriteTransaction* OnThisThread() noexcept;
+  void TakeNewObject(ptr<IPersistable> object);
+  void MarkDirty(ptr<const IPersistable> object);
+  void DeleteObject(ptr<IPersistable> object);
+  void DeleteSubTree(ptr<IPersistable> root);
+  void CheckReachable(ptr<const IPersistable> from, ptr<const IPersistable> to) const;
+  void Poison() noexcept { m_poisoned = true; }
+
+ private:
+  struct Deleted {
+    OID oid;
+    ptr<IPersistable> object;
+    bool hasRecord;
+  };
+  struct RemovedRoot {
+    std::string name;
+    OID oid;
+    bool committed;
+  };
+
+  static std::string OwnedRootName(OID oid);
+  void* FindOrMakeRoot(std::string_view name, const IPersistable::FnTable* table);
+  void* FindExistingRoot(std::string_view name, const IPersistable::FnTable* table);
+  void* MakeOwnedRoot(const IPersistable::FnTable* table);
+  void RemoveOwnedRoot(OID oid);
+  vemo::View::Root* FindRootOfClass(std::string_view name, const ClassEntry& classEntry);
+  void* MakeRoot(std::string_view name, const ClassEntry& classEntry);
+
+  bool HasChanges() const noexcept;
+  void AddRemovedRoots(CommitBatch& batch) const;
+  void Reattach() noexcept;
+  void AfterCommit(std::uint64_t generation, const std::unordered_set<OID>& written) noexcept;
+  void Finish() noexcept;
+  void RequireOpen() const;
+  void RequireOwn(ptr<const IPersistable> object) const;
+
+  CSpace& m_space;
+  std::unique_lock<std::timed_mutex> m_processLock;
+  std::unique_ptr<WriterLock> m_engineLock;
+  bool m_open = false;
+  bool m_poisoned = false;
+
+  std::unordered_map<OID, ptr<IPersistable>> m_dirty;  // flagged; new objects among them
+  std::unordered_set<OID> m_new;                       // have no record yet
+  std::vector<Deleted> m_deleted;                      // in memory until the transaction ends
+  std::unordered_set<OID> m_deletedIds;
+  std::vector<OID> m_queuedDeletions;                  // subtrees of which nothing is in memory
+  std::vector<RemovedRoot> m_removedRoots;
+  std::map<std::string, std::optional<std::string>, std::less<>> m_meta;  // nothing: erased
+};
+
+}  // namespace vemo

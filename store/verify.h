@@ -1,0 +1,34 @@
+// Checking a whole space.
+#pragma once
+
+#include <cstdint>
+#include <functional>
+#include <string>
+#include <vector>
+
+#include "store/snapshot.h"
+
+namespace vemo {
+
+struct Finding {
+  std::string root;  // the root map below which the fault lies; empty where it is the space's own
+  OID oid;           // the object at fault, or null
+  std::string fault;
+};
+
+struct VerifyReport {
+  std::vector<Finding> findings;
+  std::uint64_t maps = 0;
+  std::uint64_t entries = 0;
+  std::uint64_t nodes = 0;
+  std::uint64_t records = 0;      // in the engine
+  std::uint64_t unreachable = 0;  // of these, not reached from any root and not queued for deletion: space to be collected
+};
+
+// Checks every record's checksum and form, every map's structure (store/map_check.h, and then the map's own Validate where
+// nothing was found), every named value, and counts what no root reaches. Collects every fault; throws only when the
+// engine itself fails. Loads every node of every map; `progress` is told how many of how many records are done.
+VerifyReport VerifySpace(Snapshot& snapshot,
+                         const std::function<void(std::uint64_t done, std::uint64_t of)>& progress = {});
+
+}  // namespace vemo

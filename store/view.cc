@@ -1,0 +1,318 @@
+#include "store/view.h"
+
+#include <algorithm>
+#include <utility>
+
+#include "platform/error.h"
+#include "store/envelope.h"
+#include "vxUtils/Archive.h"
+
+namespace vemo {
+
+namespace {
+
+thread_local View* t_readingView = nullptr;
+
+class ReadingScope {
+ public:
+  explicit ReadingScope(View* view) noexcept : m_outer(std::exchange(t_readingView, view)) {}
+  ~ReadingScope() { t_readingView = m_outer; }
+  ReadingScope(const ReadingScope&) = delete;
+  ReadingScope& operator=(const ReadingScope&) = delete;
+
+ private:
+  View* m_outer;
+};
+
+constexpr std::string_view kClassPrefix = "class/";
+
+std::string ClassNumberName(std::size_t number) { return std::string(kClassPrefix) + std::to_string(number); }
+
+RootValue DecodeRootValue(std::string_view name, ByteView sealed) {
+  const ByteView value = OpenNamed(NamedTable::kRoots, name, sealed);
+  BoundedReader reader(value);
+  RootValue root;
+  root.oid = OID(reader.ReadUint64());
+  root.className.assign(value.begin() + static_cast<std::ptrdiff_t>(reader.offset()), value.end());
+  return root;
+}
+
+}  // namespace
+
+View* ReadingView() noexcept { return t_readingView; }
+
+ObjSysState& SysStateOf(ptr<const IPersistable> object) noexcept {
+  return *object.Table()->_IObject.GetSysState(object.m_self);
+}
+
+PersistObjState& PersistStateOf(ptr<const IPersistable> object) noexcept {
+  return *object.Table()->GetPersistObjState(object.m_self);
+}
+
+void DestroyObject(ptr<IPersistable> object) noexcept {
+  SysStateOf(object).ClearFlag(ObjSysState::kDirtyFlag);
+  object.Table()->_IObject.OnGarbageCollect(object.m_self);
+  object.Table()->_IObject.Destroy(object.m_self);
+}
+
+Bytes EncodeRootValue(std::string_view name, const RootValue& value) {
+  std::uint8_t oid[kMaxVariableLengthUint64Bytes];
+  Bytes bytes(oid, SerialiseVariableLengthUint64(oid, value.oid.m_value));
+  bytes.insert(bytes.end(), value.className.begin(), value.className.end());
+  return SealNamed(NamedTable::kRoots, name, bytes);
+}
+
+View::View(CSpace& space, std::string spaceName, Kind kind)
+    : m_space(space), m_spaceName(std::move(spaceName)), m_kind(kind) {}
+
+View::~View() {
+  ForgetResidents();
+  for (auto& [name, root] : m_roots) DestroyObject(root.map);
+  for (Root& root : m_retiredRoots) DestroyObject(root.map);
+}
+
+void View::Attach(std::unique_ptr<EngineSnapshot> state) {
+  const bool moved = state->Generation() != m_generation;
+  m_state = std::move(state);
+  if (moved || m_rootsAreStale) ForgetResidents();
+  if (moved) {
+    m_generation = m_state->Generation();
+    m_classes.clear();
+  }
+  if (m_classes.empty()) ReadClassNumbers();
+  if (m_rootsAreStale) ReloadRoots();
+}
+
+const EngineSnapshot& View::State() const {
+  if (m_state == nullptr) {
+    throw UsageError(m_spaceName + ": a map of the writer was read outside a transaction; open one, or take a Snapshot");
+  }
+  return *m_state;
+}
+
+std::string View::Describe(OID oid, std::string_view className, std::string_view reason) const {
+  std::string text = m_spaceName + ": object " + std::to_string(oid.m_value);
+  if (!className.empty()) text += " (" + std::string(className) + ")";
+  return text += ": " + std::string(reason);
+}
+
+// --- Objects ---
+
+ptr<IPersistable> View::Find(OID oid) const noexcept {
+  const auto found = m_residents.find(oid);
+  return found == m_residents.end() ? ptr<IPersistable>() : found->second;
+}
+
+void View::Own(ptr<IPersistable> object, OID oid) noexcept {
+  ObjSysState& state = SysStateOf(object);
+  state.m_cspace = &m_space;
+  if (m_kind == Kind::kSnapshot) state.SetFlag(kSnapshotFlag);
+  PersistStateOf(object).m_oid = oid;
+}
+
+void View::Adopt(OID oid, ptr<IPersistable> object) {
+  m_residents.emplace(oid, object);
+  Own(object, oid);
+}
+
+ptr<IPersistable> View::Resolve(OID oid, const IPersistable::FnTable* expected) {
+  ptr<IPersistable> object = Find(oid);
+  if (object.m_self == nullptr) {
+    const std::optional<ByteView> record = State().Read(oid);
+    if (!record) {
+      throw DanglingReference(Describe(oid, "", "it is referred to, but there is no record of it (run vemo verify)"), oid);
+    }
+    object = Decode(oid, *record);
+    try {
+      Adopt(oid, object);
+    } catch (...) {
+      DestroyObject(object);
+      throw;
+    }
+  }
+  if (expected != nullptr && object.Table() != expected) {
+    const ClassEntry* wanted = FindClass(expected);
+    throw CorruptRecord(Describe(oid, FindClass(object.Table())->Name(),
+                                 "a " + std::string(wanted != nullptr ? wanted->Name() : "different class") +
+                                     " should stand here (run vemo verify)"),
+                        oid);
+  }
+  return object;
+}
+
+ptr<IPersistable> View::Decode(OID oid, ByteView record) {
+  std::string_view className;
+  ptr<IPersistable> object;
+  try {
+    const RecordEnvelope envelope = OpenRecord(record, oid);
+    const ClassEntry& classEntry = ClassOf(oid, envelope.classNumber);
+    className = classEntry.Name();
+    BoundedReader reader(envelope.body);
+    classEntry.checkForm(reader);
+    reader.ExpectEnd();
+    object = ptr<IPersistable>(classEntry.reflected->m_createFn().m_self, classEntry.table);
+    const ReadingScope scope(this);
+    InputArchive archive(envelope.body.data());
+    classEntry.table->Deserialise(object.m_self, archive);
+    return object;
+  } catch (const MalformedBytes& malformed) {
+    if (object.m_self != nullptr) DestroyObject(object);
+    throw CorruptRecord(Describe(oid, className, malformed.what()), oid);
+  } catch (...) {
+    if (object.m_self != nullptr) DestroyObject(object);
+    throw;
+  }
+}
+
+// --- Classes ---
+
+void View::ReadClassNumbers() {
+  State().ScanNamed(NamedTable::kInfo, kClassPrefix, [this](std::string_view name, ByteView sealed) {
+    ByteView value;
+    try {
+      value = OpenNamed(NamedTable::kInfo, name, sealed);
+    } catch (const MalformedBytes& malformed) {
+      throw CorruptRecord(m_spaceName + ": class table, \"" + std::string(name) + "\": " + malformed.what(), OID());
+    }
+    const std::size_t number = std::stoul(std::string(name.substr(kClassPrefix.size())));
+    if (m_classes.size() < number) m_classes.resize(number);
+    m_classes[number - 1] = FindClass(std::string_view(reinterpret_cast<const char*>(value.data()), value.size()));
+    return true;
+  });
+}
+
+const ClassEntry& View::ClassOf(OID oid, std::uint32_t number) const {
+  if (number == 0 || number > m_classes.size() || m_classes[number - 1] == nullptr) {
+    throw CorruptRecord(Describe(oid, "", "its class number " + std::to_string(number) + " names no class known here"), oid);
+  }
+  return *m_classes[number - 1];
+}
+
+std::uint32_t View::ClassNumber(const ClassEntry& classEntry) const noexcept {
+  const auto found = std::find(m_classes.begin(), m_classes.end(), &classEntry);
+  return found == m_classes.end() ? 0 : static_cast<std::uint32_t>(found - m_classes.begin()) + 1;
+}
+
+std::uint32_t View::AddClassNumber(const ClassEntry& classEntry) {
+  m_classes.push_back(&classEntry);
+  return static_cast<std::uint32_t>(m_classes.size());
+}
+
+CommitBatch::NamedValue View::ClassNumberValue(std::size_t number) const {
+  const std::string name = ClassNumberName(number);
+  const std::string_view className = m_classes[number - 1]->Name();
+  const ByteView value(reinterpret_cast<const std::uint8_t*>(className.data()), className.size());
+  return {NamedTable::kInfo, name, SealNamed(NamedTable::kInfo, name, value)};
+}
+
+// --- Roots ---
+
+View::Root* View::FindRoot(std::string_view name) {
+  if (m_rootsAreStale) ReloadRoots();
+  auto found = m_roots.find(name);
+  if (found != m_roots.end() && !found->second.oid.IsNull()) return &found->second;
+  const std::optional<ByteView> sealed = State().ReadNamed(NamedTable::kRoots, name);
+  if (!sealed) return nullptr;
+  RootValue value;
+  try {
+    value = DecodeRootValue(name, *sealed);
+  } catch (const MalformedBytes& malformed) {
+    throw CorruptRecord(m_spaceName + ": root \"" + std::string(name) + "\": " + malformed.what(), OID());
+  }
+  const ClassEntry* classEntry = FindClass(value.className);
+  if (classEntry == nullptr || !classEntry->isMap) {
+    throw IncompatibleSpace(m_spaceName + ": root \"" + std::string(name) + "\" is a " + value.className +
+                            ", which this program does not know");
+  }
+  Root& root = AddRoot(name, *classEntry, value.oid);
+  try {
+    ReadRoot(name, root);
+  } catch (...) {
+    root.oid = OID();
+    throw;
+  }
+  return &root;
+}
+
+View::Root& View::AddRoot(std::string_view name, const ClassEntry& classEntry, OID oid) {
+  auto found = m_roots.find(name);
+  if (found != m_roots.end() && found->second.classEntry != &classEntry) {
+    m_retiredRoots.push_back(found->second);
+    m_roots.erase(found);
+    found = m_roots.end();
+  }
+  if (found == m_roots.end()) {
+    found = m_roots.emplace(std::string(name), Root{&classEntry, OID(), {}, false}).first;
+    try {
+      found->second.map = ptr<IPersistable>(classEntry.reflected->m_createFn().m_self, classEntry.table);
+    } catch (...) {
+      m_roots.erase(found);
+      throw;
+    }
+  }
+  found->second.oid = oid;
+  Own(found->second.map, oid);
+  return found->second;
+}
+
+// Reads the record of a root into its map, which is in the default state.
+void View::ReadRoot(std::string_view name, Root& root) {
+  const std::optional<ByteView> record = State().Read(root.oid);
+  if (!record) {
+    throw DanglingReference(Describe(root.oid, root.classEntry->Name(),
+                                     "root \"" + std::string(name) + "\" has no record (run vemo verify)"),
+                            root.oid);
+  }
+  const ptr<IPersistable> read = Decode(root.oid, *record);
+  const bool isOfClass = read.Table() == root.map.Table();
+  if (isOfClass) {
+    // Decode checked the record; reading it once more, into the map at its fixed address, cannot fail.
+    const ReadingScope scope(this);
+    InputArchive archive(OpenRecord(*record, root.oid).body.data());
+    root.map.Table()->Deserialise(root.map.m_self, archive);
+  }
+  DestroyObject(read);
+  if (!isOfClass) {
+    throw CorruptRecord(Describe(root.oid, FindClass(read.Table())->Name(),
+                                 "root \"" + std::string(name) + "\" should be a " + std::string(root.classEntry->Name())),
+                        root.oid);
+  }
+  root.committed = true;
+}
+
+void View::ResetInPlace(Root& root) noexcept {
+  SysStateOf(root.map).ClearFlag(ObjSysState::kDirtyFlag);
+  const TypeOps& ops = root.classEntry->reflected->m_ops;
+  ops.m_DestructArrayFn(root.map.m_self, ops.m_size, 1);
+  ops.m_ConstructArrayFn(root.map.m_self, ops.m_size, 1);
+  Own(root.map, root.oid);
+}
+
+void View::ForgetResidents() noexcept {
+  for (const auto& [oid, object] : m_residents) DestroyObject(object);
+  m_residents.clear();
+  for (auto& [name, root] : m_roots) {
+    if (!root.committed) root.oid = OID();
+    ResetInPlace(root);
+    m_rootsAreStale = true;
+  }
+}
+
+void View::ReloadRoots() {
+  for (auto& [name, root] : m_roots) {
+    root.oid = OID();
+    root.committed = false;
+    Own(root.map, OID());
+  }
+  std::vector<std::string> names;
+  for (const auto& [name, root] : m_roots) names.push_back(name);
+  m_rootsAreStale = false;
+  try {
+    for (const std::string& name : names) FindRoot(name);
+  } catch (...) {
+    m_rootsAreStale = true;
+    throw;
+  }
+}
+
+}  // namespace vemo

@@ -1,0 +1,138 @@
+// The objects of one state of a space that are in memory.
+//
+//                    Adopt                 (commit)              
+//        [made] ------------> new --------------------+
+//                              |                      v       MarkDirty
+//   [stored] -- Resolve ---------------------------> clean <------------> dirty
+//                              |                      |    (commit)         |
+//                              |    Release           |                     |
+//                              +-----------+----------+---------------------+
+//                                          v
+//                                    on the way out -- DestroyObject --> [gone]
+//
+// Invariants:
+//   V1. An object of the view is in the residents under its id, or is the map of a root, or is on the way out.
+//   V2. A reference that was read in the view and is not bound carries the view's address, so that it resolves here
+//       whatever else its thread has open.
+//   V3. Nothing in the view is newer than its commit, unless it is the writer's view inside a transaction.
+#pragma once
+
+#include <cstdint>
+#include <map>
+#include <memory>
+#include <string>
+#include <string_view>
+#include <unordered_map>
+#include <vector>
+
+#include "store/class_registry.h"
+#include "store/engine.h"
+#include "vxPersistStore/pref.h"
+
+namespace vemo {
+
+// Bits of ObjSysState::objflags_ that the store uses beside the dirty flag.
+inline constexpr int kSnapshotFlag = 2;  // the object belongs to a snapshot and must not be marked
+inline constexpr int kDeletedFlag = 3;   // the object was deleted in the open transaction
+
+ObjSysState& SysStateOf(ptr<const IPersistable> object) noexcept;
+PersistObjState& PersistStateOf(ptr<const IPersistable> object) noexcept;
+
+// Clears the dirty flag, tells the object that it is collected, and ends it.
+void DestroyObject(ptr<IPersistable> object) noexcept;
+
+// The value of a root: which map stands behind a name.
+struct RootValue {
+  std::string className;
+  OID oid;
+};
+Bytes EncodeRootValue(std::string_view name, const RootValue& value);
+
+class View {
+ public:
+  enum class Kind : std::uint8_t { kWriter, kSnapshot };
+
+  // A root map keeps its address as long as the view lives. A root that is not (or no longer) in the space has a null id.
+  struct Root {
+    const ClassEntry* classEntry = nullptr;
+    OID oid;
+    ptr<IPersistable> map;
+    bool committed = false;
+  };
+
+  View(CSpace& space, std::string spaceName, Kind kind);
+  ~View();
+  View(const View&) = delete;
+  View& operator=(const View&) = delete;
+
+  // Shows the commit of `state` from now on. Objects of another commit are forgotten and root maps read anew in place.
+  void Attach(std::unique_ptr<EngineSnapshot> state);
+  // Goes on with a state of the commit that the view shows already.
+  void Resume(std::unique_ptr<EngineSnapshot> state) noexcept { m_state = std::move(state); }
+  // Lets go of the engine's state; objects stay, loading is refused.
+  void Detach() noexcept { m_state.reset(); }
+  bool IsAttached() const noexcept { return m_state != nullptr; }
+  const EngineSnapshot& State() const;
+  std::uint64_t Generation() const noexcept { return m_generation; }
+  // The view's objects are now those of that commit, which this process has just made.
+  void Advance(std::uint64_t generation) noexcept { m_generation = generation; }
+
+  // The object `oid`, read if it is not in memory. Throws CorruptRecord when there is no sound record of it, or when its
+  // table is not `expected` (null: any of the nine classes).
+  ptr<IPersistable> Resolve(OID oid, const IPersistable::FnTable* expected);
+
+  // Checks a record and reads it into a fresh object that belongs to nobody yet; its references carry this view.
+  ptr<IPersistable> Decode(OID oid, ByteView record);
+
+  // The resident `oid`, or null.
+  ptr<IPersistable> Find(OID oid) const noexcept;
+  // Takes a new object in.
+  void Adopt(OID oid, ptr<IPersistable> object);
+  // Removes a resident without ending it.
+  void Release(OID oid) noexcept { m_residents.erase(oid); }
+
+  // The root of that name, its map read if need be; null when the space has none.
+  Root* FindRoot(std::string_view name);
+  // Enters a root that the open transaction makes.
+  Root& AddRoot(std::string_view name, const ClassEntry& classEntry, OID oid);
+  std::map<std::string, Root, std::less<>>& Roots() noexcept { return m_roots; }
+
+  // Ends all residents and sets root maps back to the default state, in place.
+  void ForgetResidents() noexcept;
+  // Reads all root maps anew after ForgetResidents; until it has succeeded, Attach tries again.
+  void ReloadRoots();
+
+  // The number by which records of this space name a class; 0 when no record does yet.
+  std::uint32_t ClassNumber(const ClassEntry& classEntry) const noexcept;
+  std::uint32_t AddClassNumber(const ClassEntry& classEntry);
+  std::size_t NumClassNumbers() const noexcept { return m_classes.size(); }
+  void TruncateClassNumbers(std::size_t count) noexcept { m_classes.resize(count); }
+  // What a commit stores for the class of that number.
+  CommitBatch::NamedValue ClassNumberValue(std::size_t number) const;
+
+  // The message of an exception about object `oid`.
+  std::string Describe(OID oid, std::string_view className, std::string_view reason) const;
+
+ private:
+  const ClassEntry& ClassOf(OID oid, std::uint32_t number) const;
+  void ReadClassNumbers();
+  void ReadRoot(std::string_view name, Root& root);
+  void Own(ptr<IPersistable> object, OID oid) noexcept;
+  void ResetInPlace(Root& root) noexcept;
+
+  CSpace& m_space;
+  std::string m_spaceName;
+  Kind m_kind;
+  std::unique_ptr<EngineSnapshot> m_state;
+  std::uint64_t m_generation = 0;
+  bool m_rootsAreStale = false;
+  std::vector<const ClassEntry*> m_classes;  // number - 1 -> class; null where this program does not know it
+  std::unordered_map<OID, ptr<IPersistable>> m_residents;
+  std::map<std::string, Root, std::less<>> m_roots;
+  std::vector<Root> m_retiredRoots;  // maps whose name now stands for another class
+};
+
+// The view in which references are being read on this thread; null outside of View::Decode.
+View* ReadingView() noexcept;
+
+}  // namespace vemo
