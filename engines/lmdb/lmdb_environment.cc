@@ -8,7 +8,6 @@
 #include <bit>
 #include <cerrno>
 #include <memory>
-#include <utility>
 
 #include "engines/lmdb/lmdb_error.h"
 #include "platform/error.h"

@@ -7,7 +7,6 @@
 #include <cerrno>
 #include <map>
 #include <mutex>
-#include <string_view>
 #include <system_error>
 #include <utility>
 

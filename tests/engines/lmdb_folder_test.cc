@@ -145,6 +145,38 @@ TEST_F(LmdbFolder, ASpaceWithoutOneOfItsTablesIsRefused) {
   EXPECT_TRUE(Contains(message, "\"roots\"")) << message;
 }
 
+TEST_F(LmdbFolder, ADataFileThatIsAFolderIsRefused) {
+  fs::create_directories(space() / "data.mdb");
+  EXPECT_THROW(OpenAt(space()), IncompatibleSpace);
+  EXPECT_THROW(OpenAt(space(), true), IncompatibleSpace);
+  EXPECT_EQ(FilesIn(space()), std::set<std::string>{"data.mdb"});
+}
+
+TEST_F(LmdbFolder, ASpaceThatLostItsNumbersIsRefusedWithTheirName) {
+  OpenAt(space(), true);
+  MakeEnvironment(space(), [](MDB_txn* txn) {
+    PutText(txn, "system", "generation", "short");
+    PutText(txn, "system", "next id", "");
+  });
+  const auto engine = OpenAt(space());
+  const std::string generation = MessageOf<IncompatibleSpace>([&] { engine->OpenSnapshot(); });
+  EXPECT_TRUE(Contains(generation, "its generation is missing or damaged")) << generation;
+  const std::string nextId = MessageOf<IncompatibleSpace>([&] { engine->ReserveIds(1); });
+  EXPECT_TRUE(Contains(nextId, "its next id is missing or damaged")) << nextId;
+  EXPECT_EQ(engine->Usage().records, 0u);
+}
+
+TEST_F(LmdbFolder, AKeyThatIsNoIdIsRefusedWhereAScanMeetsIt) {
+  BatchBuilder batch;
+  batch.Put(1, "one");
+  OpenAt(space(), true)->Commit(batch.At(0));
+  MakeEnvironment(space(), [](MDB_txn* txn) { PutText(txn, "records", "short", "value"); });
+  const auto engine = OpenAt(space());
+  const auto snapshot = engine->OpenSnapshot();
+  EXPECT_EQ(ToText(snapshot->Read(OID(1))), "one");
+  EXPECT_THROW(AllRecords(*snapshot), IncompatibleSpace);
+}
+
 TEST_F(LmdbFolder, ACreationInterruptedBeforeItsFirstByteIsFinished) {
   fs::create_directory(space());
   WriteFile(space() / "lock.mdb", "");

@@ -87,6 +87,12 @@ TEST_F(LmdbMap, TooManySnapshotsAreRefusedWithAdvice) {
   EXPECT_EQ(engine->OpenSnapshot()->Generation(), 0u);
 }
 
+CommitBatch CommitBatchAt(std::uint64_t generation) {
+  CommitBatch batch;
+  batch.expectedGeneration = generation;
+  return batch;
+}
+
 bool CommitFails(Engine& engine, const CommitBatch& batch) {
   try {
     engine.Commit(batch);
@@ -196,6 +202,21 @@ TEST_P(LmdbDisk, SnapshotsStayReadableWhateverFailsAndTheEngineGoesOnAfterThem) 
         << "call " << nth;
   }
   EXPECT_EQ(stopped, 1);
+}
+
+TEST_P(LmdbDisk, ASpaceRemovedUnderAStoppedEngineIsNotMadeAnew) {
+  const auto engine = OpenAt(space(), true);
+  auto snapshot = engine->OpenSnapshot();
+  std::uint64_t generation = 0;
+  for (int nth = 1; !CommitFails(*engine, CommitBatchAt(generation)); ++nth) {
+    ++generation;
+    const FailingDisk disk(nth, StaysBroken());
+    if (!CommitFails(*engine, CommitBatchAt(generation))) ++generation;
+  }
+  snapshot.reset();
+  std::filesystem::remove_all(space());
+  EXPECT_THROW(engine->Commit(CommitBatchAt(generation)), SpaceNotFound);
+  EXPECT_FALSE(std::filesystem::exists(space()));
 }
 
 TEST_P(LmdbDisk, ACreationThatFailsAnywhereCanBeRepeated) {

@@ -2,17 +2,19 @@
 #include <gtest/gtest.h>
 #include <sys/resource.h>
 
+#include <cerrno>
 #include <chrono>
 #include <fstream>
+#include <system_error>
 
 #include "tests/engines/child_process.h"
 #include "tests/engines/lmdb_site.h"
 #include "tests/support/temp_folder.h"
 
-#if defined(__SANITIZE_ADDRESS__)
+#if defined(__SANITIZE_ADDRESS__) || defined(__SANITIZE_THREAD__)
 #define VEMO_TEST_HAS_SHADOW_MEMORY 1
 #elif defined(__has_feature)
-#if __has_feature(address_sanitizer)
+#if __has_feature(address_sanitizer) || __has_feature(thread_sanitizer)
 #define VEMO_TEST_HAS_SHADOW_MEMORY 1
 #endif
 #endif
@@ -260,23 +262,112 @@ TEST_F(LmdbProcess, AForkedChildMayOpenTheSpaceAnew) {
   EXPECT_EQ(NewestContents(*engine).records, (Records{{1, "from the child"}}));
 }
 
-TEST_F(LmdbProcess, OpensUnderALimitOfAddressSpace) {
-#if defined(VEMO_TEST_HAS_SHADOW_MEMORY)
-  GTEST_SKIP() << "the sanitizer itself maps more than the limit";
-#endif
+TEST_F(LmdbProcess, PagesKeptByAReaderKilledMeanwhileAreUsedAgainBeforeTheMapGrows) {
+  constexpr std::uint64_t kMapBytes = 4 * kMiB;
+  const auto engine = OpenAt(space(), true, kMapBytes);
+  ChildProcess child([&](const Conversation& parent) {
+    const auto own = OpenAt(space());
+    const auto snapshot = own->OpenSnapshot();
+    parent.Say("reading");
+    parent.Hear();
+    return true;
+  });
+  ASSERT_EQ(child.Hear(), "reading");
+  child.Kill();
+  std::uint64_t generation = 0;
+  for (int i = 0; i < 20; ++i) {
+    BatchBuilder batch = OneRecord(1, std::string(kMiB, static_cast<char>('a' + i)));
+    generation = engine->Commit(batch.At(generation));
+  }
+  EXPECT_LE(engine->Usage().bytes, kMapBytes);
+}
+
+TEST_F(LmdbProcess, AProcessWithoutPermissionIsToldSo) {
   MakeSpace();
+  namespace fs = std::filesystem;
+  for (const auto& file : fs::directory_iterator(space())) fs::permissions(file, fs::perms::none);
+  fs::permissions(space().parent_path(),
+                  fs::perms::owner_all | fs::perms::others_exec | fs::perms::others_read);
   ChildProcess child([&](const Conversation&) {
+    constexpr uid_t kNobody = 65534;
+    if (::getuid() == 0 && ::setresuid(kNobody, kNobody, kNobody) != 0) return false;
+    const std::string refused = MessageOf<StoreError>([&] { OpenAt(space()); });
+    const std::string uncreated =
+        MessageOf<StoreError>([&] { OpenAt("/vemo-test-without-permission", true); });
+    return Contains(refused, "write permission") && Contains(uncreated, "write permission");
+  });
+  EXPECT_TRUE(child.Succeeded());
+}
+
+// Under a limit of address space that leaves little beyond what the process has mapped already. The
+// sanitizers map more than any limit.
+class LmdbLimitedProcess : public LmdbProcess {
+ protected:
+  void SetUp() override {
+#if defined(VEMO_TEST_HAS_SHADOW_MEMORY)
+    GTEST_SKIP() << "the sanitizer itself maps more than the limit";
+#endif
+  }
+
+  static void LimitAddressSpace(std::uint64_t moreBytes) {
     std::uint64_t pages = 0;
     std::ifstream("/proc/self/statm") >> pages;
     rlimit limit{};
-    limit.rlim_cur = pages * static_cast<std::uint64_t>(::sysconf(_SC_PAGESIZE)) + 64 * kMiB;
+    limit.rlim_cur = pages * static_cast<std::uint64_t>(::sysconf(_SC_PAGESIZE)) + moreBytes;
     limit.rlim_max = limit.rlim_cur;
-    if (::setrlimit(RLIMIT_AS, &limit) != 0) return false;
+    if (::setrlimit(RLIMIT_AS, &limit) != 0)
+      throw std::system_error(errno, std::generic_category(), "setrlimit");
+  }
+};
+
+TEST_F(LmdbLimitedProcess, OpensWithWhatItMayMap) {
+  MakeSpace();
+  ChildProcess child([&](const Conversation&) {
+    LimitAddressSpace(64 * kMiB);
     const auto engine = OpenAt(space());
     BatchBuilder batch = OneRecord(1, std::string(kMiB, 'x'));
     return engine->Commit(batch.At(0)) == 1;
   });
   EXPECT_TRUE(child.Succeeded());
+}
+
+TEST_F(LmdbLimitedProcess, GoesOnAfterAGrowthThatIsBeyondItsLimit) {
+  MakeSpace();
+  ChildProcess child([&](const Conversation&) {
+    LimitAddressSpace(64 * kMiB);
+    const auto engine = OpenAt(space(), false, 16 * kMiB);
+    const std::string half(5 * kMiB, 'x');
+    bool refused = false;
+    std::uint64_t generation = 0;
+    for (std::uint64_t oid = 1; !refused && oid < 20; ++oid) {
+      BatchBuilder batch = OneRecord(oid, half);
+      refused = Throws<StoreError>([&] { generation = engine->Commit(batch.At(generation)); });
+    }
+    const bool isWhole =
+        engine->Usage().records == generation && engine->OpenSnapshot()->Read(OID(1))->size() == half.size();
+    BatchBuilder removal;
+    removal.Remove(1).Remove(2);
+    return refused && isWhole && engine->Commit(removal.At(generation)) == generation + 1;
+  });
+  EXPECT_TRUE(child.Succeeded());
+}
+
+TEST_F(LmdbLimitedProcess, AdoptsAsMuchOfTheGrowthOfAnotherProcessAsItMay) {
+  const auto engine = OpenAt(space(), true);
+  ChildProcess child([&](const Conversation& parent) {
+    LimitAddressSpace(64 * kMiB);
+    const auto own = OpenAt(space(), false, kMiB);
+    parent.Say("open");
+    parent.Hear();
+    BatchBuilder batch = OneRecord(2, "two");
+    return own->Commit(batch.At(1)) == 2 && own->OpenSnapshot()->Read(OID(1))->size() == 4 * kMiB;
+  });
+  ASSERT_EQ(child.Hear(), "open");
+  BatchBuilder batch = OneRecord(1, std::string(4 * kMiB, 'x'));
+  engine->Commit(batch.At(0));
+  child.Say("go");
+  EXPECT_TRUE(child.Succeeded());
+  EXPECT_EQ(engine->Usage().records, 2u);
 }
 
 }  // namespace
