@@ -120,7 +120,7 @@ class xvector {
 
   static void CopyElements(const T* src1, const T* src2, std::byte* dst) {
     VEMO_ASSERT(src1 == src2 || dst != nullptr);
-    if (src1 != src2) std::memcpy(dst, src1, static_cast<std::size_t>(src2 - src1) * sizeof(T));
+    if (src1 < src2) std::memcpy(dst, src1, static_cast<std::size_t>(src2 - src1) * sizeof(T));
   }
 };
 
