@@ -29,4 +29,11 @@ function(vemo_test name)
                                              VEMO_BINARY_DIR="${PROJECT_BINARY_DIR}")
   set_target_properties(${name} PROPERTIES RUNTIME_OUTPUT_DIRECTORY ${PROJECT_BINARY_DIR}/tests)
   add_test(NAME ${name} COMMAND ${name})
+  set_property(GLOBAL APPEND_STRING PROPERTY VEMO_TEST_PROGRAMS "${PROJECT_BINARY_DIR}/tests/${name}\n")
+endfunction()
+
+# Writes the list of test programs that ./test runs.
+function(vemo_list_tests)
+  get_property(programs GLOBAL PROPERTY VEMO_TEST_PROGRAMS)
+  file(WRITE ${PROJECT_BINARY_DIR}/tests/programs.txt "${programs}")
 endfunction()

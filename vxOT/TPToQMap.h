@@ -59,6 +59,11 @@ class TPtoQMap {
   // m_tombstones, is replaced by the maximal runs of q positions that were live before, in ascending order;
   // when the call throws, it is empty.
   void Erasep(T p, T n, IntervalList<T>& erased);
+  // The same for callers who need not know which positions died.
+  void Erasep(T p, T n) {
+    IntervalList<T> erased;
+    Erasep(p, n, erased);
+  }
 
   void swap(TPtoQMap& other) noexcept { m_tombstones.swap(other.m_tombstones); }
 
