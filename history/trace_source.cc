@@ -46,7 +46,6 @@ class RecordingReader {
   void CheckKind(const dom::object& root) const;
   void ReadPatch(const dom::element& element);
   ssize_t ReadNumber(const dom::element& element, const char* name) const;
-  std::size_t CountText(std::string_view text, const char* name) const;
 
   const std::filesystem::path& m_file;
   Recording& m_recording;
@@ -96,14 +95,6 @@ ssize_t RecordingReader::ReadNumber(const dom::element& element, const char* nam
   return number;
 }
 
-std::size_t RecordingReader::CountText(std::string_view text, const char* name) const {
-  try {
-    return CountCodePoints(text);
-  } catch (const MalformedBytes& error) {
-    Throw(std::string("the ") + name + " is not Unicode text: " + error.what());
-  }
-}
-
 void RecordingReader::ReadPatch(const dom::element& element) {
   dom::array parts;
   if (element.get(parts) != simdjson::SUCCESS || parts.size() != 3) {
@@ -113,7 +104,7 @@ void RecordingReader::ReadPatch(const dom::element& element) {
   patch.position = ReadNumber(parts.at(0).value_unsafe(), "position");
   patch.deleted = ReadNumber(parts.at(1).value_unsafe(), "deleted count");
   if (parts.at(2).get(patch.inserted) != simdjson::SUCCESS) Throw("the inserted text is not a string");
-  const auto inserted = static_cast<ssize_t>(CountText(patch.inserted, "inserted text"));
+  const auto inserted = static_cast<ssize_t>(CountCodePoints(patch.inserted));
   if (patch.position < 0 || patch.position > m_length) {
     Throw("the position " + std::to_string(patch.position) + " is out of range in a document of " +
           std::to_string(m_length) + " code points");
@@ -144,7 +135,6 @@ void RecordingReader::Read() {
         "replayed");
   }
   m_recording.endContent = Get<std::string_view>(recording, "endContent", "a string");
-  CountText(m_recording.endContent, "field \"endContent\"");
   const auto transactions = Get<dom::array>(recording, "txns", "an array");
   m_isInTransaction = true;
   for (const dom::element& element : transactions) {
@@ -169,6 +159,7 @@ class TraceSource : public EditSource {
     RecordingReader(m_file, m_recording).Read();
   }
 
+  std::optional<FieldId> OnlyField() const override { return m_field; }
   std::string Describe() const override { return "recording " + m_file.string(); }
   SkippedFiles Skipped() override { return {}; }
 
