@@ -1,0 +1,56 @@
+#include <fmt/core.h>
+
+#include <CLI/CLI.hpp>
+#include <memory>
+
+#include "history/source_error.h"
+#include "history/verify_history.h"
+#include "store/verify.h"
+#include "tool/commands.h"
+#include "tool/numbers.h"
+#include "tool/progress_bar.h"
+
+namespace vemo::tool {
+
+namespace {
+
+void PrintFinding(const Finding& finding) {
+  fmt::print("{}{}{}\n", finding.root.empty() ? "" : "root \"" + OneLine(finding.root) + "\", ",
+             finding.oid.IsNull() ? "" : fmt::format("object {}: ", finding.oid.m_value), OneLine(finding.fault));
+}
+
+ExitCode RunVerify(const std::string& store) {
+  const auto space = CSpace::Open(store);
+  Snapshot snapshot(*space);
+  VerifyReport report;
+  {
+    ProgressBar bar("verifying", space->Usage().records);
+    report = VerifySpace(snapshot, [&bar](std::uint64_t done, std::uint64_t) { bar.Update(done); });
+  }
+  for (const Finding& finding : report.findings) PrintFinding(finding);
+  std::size_t findings = report.findings.size();
+  // What the maps say to one another can be compared only where each is sound.
+  if (findings == 0 && HasHistory(snapshot)) {
+    for (const HistoryFinding& finding : VerifyHistory(snapshot)) {
+      fmt::print("field {}: {}\n", FieldIdText(finding.field), finding.fault);
+      ++findings;
+    }
+  }
+  fmt::print("{} maps, {} entries, {} nodes, {} records, {} unreachable: {}\n", Grouped(report.maps),
+             Grouped(report.entries), Grouped(report.nodes), Grouped(report.records), Grouped(report.unreachable),
+             findings == 0 ? "sound" : fmt::format("{} findings", findings));
+  return findings == 0 ? kGood : kFinding;
+}
+
+}  // namespace
+
+void AddVerifyCommand(CLI::App& app, Command& chosen) {
+  auto store = std::make_shared<std::string>();
+  CLI::App* command =
+      app.add_subcommand("verify", "Check checksums, every map's structure and that the maps agree with one another");
+  command->add_option("store", *store, "The space: lmdb:PATH")->required();
+  command->footer("Example:\n  vemo verify lmdb:/tmp/history");
+  command->callback([store, &chosen] { chosen = [store] { return RunVerify(*store); }; });
+}
+
+}  // namespace vemo::tool
