@@ -33,7 +33,8 @@ class Path {
   std::uint32_t size() const noexcept { return m_size; }
   bool empty() const noexcept { return m_size == 0; }
 
-  // Replaces the contents by `size` elements for the caller to fill in.
+  // Makes the path `size` elements long, for the caller to fill in; what it held stays where it does not grow beyond the
+  // storage it has.
   std::span<Element> Resize(std::uint32_t size);
 
   friend bool operator==(const Path& a, const Path& b) noexcept {

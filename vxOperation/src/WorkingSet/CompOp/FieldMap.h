@@ -26,6 +26,7 @@
 #include <iterator>
 #include <optional>
 #include <utility>
+#include <vector>
 
 #include "vxOperation/src/WorkingSet/CompOp/FieldMapIterator.h"
 #include "vxOperation/src/WorkingSet/CompOp/FieldMapNodes.h"
@@ -39,18 +40,48 @@ template <class Payload>
 class PayloadArgument {
  public:
   explicit PayloadArgument(const Payload& payload) noexcept : m_payload(&payload) {}
+  explicit PayloadArgument(Payload&& payload) noexcept : m_payload(&payload), m_movable(&payload) {}
 
-  const Payload& Get() const noexcept { return m_copy ? *m_copy : *m_payload; }
+  // Gives the payload to `target`: moved where the caller allowed it.
+  void AssignTo(Payload& target) {
+    if (m_held) {
+      target = std::move(*m_held);
+    } else if (m_movable != nullptr) {
+      target = std::move(*m_movable);
+    } else {
+      target = *m_payload;
+    }
+  }
 
-  // Copies the payload if it lies in the bytes [begin, end).
-  void CopyIfWithin(const void* begin, const void* end) {
+  // Takes the payload out of harm's way if it lies in the bytes [begin, end).
+  void HoldIfWithin(const void* begin, const void* end) {
     const std::less<const void*> before;
-    if (!before(m_payload, begin) && before(m_payload, end)) m_copy.emplace(*m_payload);
+    if (before(m_payload, begin) || !before(m_payload, end)) return;
+    if (m_movable != nullptr) {
+      m_held.emplace(std::move(*m_movable));
+    } else {
+      m_held.emplace(*m_payload);
+    }
   }
 
  private:
   const Payload* m_payload;
-  std::optional<Payload> m_copy;
+  Payload* m_movable = nullptr;
+  std::optional<Payload> m_held;
+};
+
+// Two iterators as a range.
+template <class Iterator>
+class FieldMapRange {
+ public:
+  FieldMapRange(Iterator first, Iterator last) : m_first(first), m_last(last) {}
+  Iterator begin() const { return m_first; }
+  Iterator end() const { return m_last; }
+  bool empty() const { return m_first == m_last; }
+
+ private:
+  Iterator m_first;
+  Iterator m_last;
 };
 
 template <class Traits>
@@ -91,6 +122,10 @@ class TFieldMap : public PersistableMixin<IObjectBaseMixin<typename Traits::Map,
   TFieldMap(const TFieldMap& other);
   // Copy and swap. The nodes held before are not deleted: the store collects what nothing names.
   Map& operator=(const TFieldMap& other);
+  // Takes over the nodes of `other`, which is marked and left empty.
+  TFieldMap(TFieldMap&& other);
+  // The same; the nodes held before are deleted as by clear().
+  Map& operator=(TFieldMap&& other);
   ~TFieldMap() = default;
 
   // --- Looking up: no entry changes, nothing is marked, nodes may be loaded. ---
@@ -104,6 +139,12 @@ class TFieldMap : public PersistableMixin<IObjectBaseMixin<typename Traits::Map,
   ssize_t count(const FieldId& key) const { return contains(key) ? 1 : 0; }
   const_iterator lower_bound(const FieldId& key) const;
   const_iterator upper_bound(const FieldId& key) const;
+  std::pair<const_iterator, const_iterator> equal_range(const FieldId& key) const {
+    return {lower_bound(key), upper_bound(key)};
+  }
+  // The entries of one object, and those at or below one of its fields: for (const auto& [key, payload] : map.FieldsOf(id)).
+  FieldMapRange<const_iterator> FieldsOf(OID object) const { return FieldsBelow(FieldId{object, Path()}); }
+  FieldMapRange<const_iterator> FieldsBelow(const FieldId& prefix) const;
 
   // Dereferencing an `iterator` marks its leaf dirty, so a loop that only reads should run over a constant map or from
   // cbegin() to cend().
@@ -133,8 +174,19 @@ class TFieldMap : public PersistableMixin<IObjectBaseMixin<typename Traits::Map,
   void wFind(wFindRet& ret, const FieldId& key, bool create, PayloadArgument<Payload>* argument = nullptr);
   // An existing key keeps its payload.
   std::pair<iterator, bool> insert(const value_type& value);
+  std::pair<iterator, bool> insert(value_type&& value);
   // True when the key was new. With `replace`, the payload of an existing key is assigned.
   bool Insert(const FieldId& key, const Payload& payload, bool replace);
+  bool Insert(const FieldId& key, Payload&& payload, bool replace);
+  // Marks the leaf of an existing key once and calls `change(payload)`; false when there is no such key. An exception of
+  // `change` passes through, and the transaction cannot be committed any more.
+  template <class Change>
+  bool Edit(const FieldId& key, Change&& change);
+  // Fills an empty map with entries in strictly ascending order of keys. Leaves get `fill` (0.5 to 1) of their capacity, where
+  // inserting one by one in ascending order leaves them half full; levels above are filled alike. Linear; holds one reference
+  // and key a leaf besides. Throws UsageError when the map is not empty, the keys do not ascend or `fill` is out of range.
+  template <class Iterator>
+  void BulkLoad(Iterator first, Iterator last, double fill = 1.0);
   // The payload under `key`, made if missing, for changing: the leaf is marked.
   Payload& operator[](const FieldId& key);
 
@@ -218,6 +270,17 @@ class TFieldMap : public PersistableMixin<IObjectBaseMixin<typename Traits::Map,
   IteratorPolicy FirstPosition() const { return {m_firstLeaf.Get(), 0}; }
   IteratorPolicy EndPosition() const;
   LeafNode* DescendToLeaf(const FieldId& key) const;
+  std::pair<iterator, bool> InsertArgument(const FieldId& key, PayloadArgument<Payload>& argument);
+  bool InsertArgument(const FieldId& key, PayloadArgument<Payload>& argument, bool replace);
+  // A subtree that BulkLoad has finished, and its smallest key.
+  struct LoadedNode {
+    FieldId firstKey;
+    cref<void> node;
+  };
+  template <class Iterator>
+  std::vector<LoadedNode> LoadLeaves(Iterator first, Iterator last, ssize_t perLeaf);
+  void FillLastLeaf(std::vector<LoadedNode>& leaves);
+  std::vector<LoadedNode> LoadLevel(std::vector<LoadedNode>& children, ssize_t perNode);
   IteratorPolicy BoundPosition(LeafNode* leaf, ssize_t j) const;
 
   void MakeRootLeaf();

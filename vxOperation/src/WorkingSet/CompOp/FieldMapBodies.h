@@ -2,6 +2,7 @@
 #pragma once
 
 #include "vxOperation/src/WorkingSet/CompOp/FieldMapDelete.h"
+#include "vxOperation/src/WorkingSet/CompOp/FieldMapFill.h"
 #include "vxOperation/src/WorkingSet/CompOp/FieldMapInsert.h"
 #include "vxOperation/src/WorkingSet/CompOp/FieldMapRecords.h"
 #include "vxOperation/src/WorkingSet/CompOp/FieldMapSearch.h"

@@ -101,7 +101,7 @@ typename Traits::LeafNode* TFieldMap<Traits>::wFindInLeaf(wFindRet& ret, LeafNod
     ret = {null, nullptr, nullptr, -1, false};
     return nullptr;
   }
-  if (argument != nullptr) argument->CopyIfWithin(left->m_entrys.Slot(0), left->m_entrys.Slot(nk));
+  if (argument != nullptr) argument->HoldIfWithin(left->m_entrys.Slot(0), left->m_entrys.Slot(nk));
   PendingValue<FieldId> newKey(key);
   ret.m_created = true;
   ++m_size;
@@ -237,14 +237,26 @@ void TFieldMap<Traits>::SplitInternalNode(InternalNode* left, const InternalKeyE
 
 template <class Traits>
 std::pair<typename TFieldMap<Traits>::iterator, bool> TFieldMap<Traits>::insert(const value_type& value) {
-  MutationScope scope(this->GetThisAsFinalClass());
   PayloadArgument<Payload> argument(value.second);
+  return InsertArgument(value.first, argument);
+}
+
+template <class Traits>
+std::pair<typename TFieldMap<Traits>::iterator, bool> TFieldMap<Traits>::insert(value_type&& value) {
+  PayloadArgument<Payload> argument(std::move(value.second));
+  return InsertArgument(value.first, argument);
+}
+
+template <class Traits>
+std::pair<typename TFieldMap<Traits>::iterator, bool> TFieldMap<Traits>::InsertArgument(
+    const FieldId& key, PayloadArgument<Payload>& argument) {
+  MutationScope scope(this->GetThisAsFinalClass());
   wFindRet ret;
-  wFind(ret, value.first, true, &argument);
+  wFind(ret, key, true, &argument);
   VEMO_ASSERT(ret.m_leaf);
   if (ret.m_created) {
     VEMO_ASSERT(ret.m_payload);
-    *ret.m_payload = argument.Get();
+    argument.AssignTo(*ret.m_payload);
     VEMO_ASSERT_TEXT(ret.m_containingNode.m_self != nullptr, "ret.m_containingNode");
     MarkPersistentAsDirtyWithoutTrace(ret.m_containingNode);
   }
@@ -254,13 +266,24 @@ std::pair<typename TFieldMap<Traits>::iterator, bool> TFieldMap<Traits>::insert(
 
 template <class Traits>
 bool TFieldMap<Traits>::Insert(const FieldId& key, const Payload& payload, bool replace) {
-  MutationScope scope(this->GetThisAsFinalClass());
   PayloadArgument<Payload> argument(payload);
+  return InsertArgument(key, argument, replace);
+}
+
+template <class Traits>
+bool TFieldMap<Traits>::Insert(const FieldId& key, Payload&& payload, bool replace) {
+  PayloadArgument<Payload> argument(std::move(payload));
+  return InsertArgument(key, argument, replace);
+}
+
+template <class Traits>
+bool TFieldMap<Traits>::InsertArgument(const FieldId& key, PayloadArgument<Payload>& argument, bool replace) {
+  MutationScope scope(this->GetThisAsFinalClass());
   wFindRet ret;
   wFind(ret, key, true, &argument);
   VEMO_ASSERT(ret.m_payload);
   if (replace || ret.m_created) {
-    *ret.m_payload = argument.Get();
+    argument.AssignTo(*ret.m_payload);
     VEMO_ASSERT_TEXT(ret.m_containingNode.m_self != nullptr, "ret.m_containingNode");
     MarkPersistentAsDirtyWithoutTrace(ret.m_containingNode);
   }

@@ -61,6 +61,8 @@
     Name() = default;                                                                                                \
     Name(const Name&) = default;                                                                                     \
     Name& operator=(const Name& other) { return TFieldMap::operator=(other); }                                       \
+    Name(Name&& other) : TFieldMap(static_cast<TFieldMap&&>(other)) {}                                               \
+    Name& operator=(Name&& other) { return TFieldMap::operator=(static_cast<TFieldMap&&>(other)); }                  \
   };                                                                                                                 \
   class Name##InternalNode final : public ::vemo::TFieldMapInternalNode<Name##Traits> {};                            \
   class Name##LeafNode final : public ::vemo::TFieldMapLeafNode<Name##Traits> {};                                    \

@@ -1,6 +1,8 @@
 // Searching a field map: bodies of the functions that FieldMap.h and FieldMapNodes.h declare.
 #pragma once
 
+#include <limits>
+
 #include "vxOperation/src/WorkingSet/CompOp/FieldMap.h"
 #include "platform/assertion.h"
 
@@ -154,6 +156,23 @@ typename TFieldMap<Traits>::const_iterator TFieldMap<Traits>::upper_bound(const 
   LeafNode* leaf = DescendToLeaf(key);
   if (leaf == nullptr) return const_iterator(IteratorPolicy(nullptr, 0));
   return const_iterator(BoundPosition(leaf, UpperBoundInLeaf(key, leaf)));
+}
+
+// The range ends where the prefix with its last number one higher would stand; a number that cannot grow drops out, and then
+// it is the number before it, or the object, that grows.
+template <class Traits>
+FieldMapRange<typename TFieldMap<Traits>::const_iterator> TFieldMap<Traits>::FieldsBelow(const FieldId& prefix) const {
+  FieldId bound = prefix;
+  const auto elements = prefix.path.elements();
+  auto size = static_cast<std::uint32_t>(elements.size());
+  while (size > 0 && elements[size - 1] == std::numeric_limits<Path::Element>::max()) --size;
+  bound.path = Path(elements.first(size));
+  if (size > 0) {
+    ++bound.path.Resize(size)[size - 1];
+  } else if (++bound.oid.m_value == 0) {
+    return {lower_bound(prefix), end()};
+  }
+  return {lower_bound(prefix), lower_bound(bound)};
 }
 
 template <class Traits>

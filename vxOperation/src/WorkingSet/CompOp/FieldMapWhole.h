@@ -24,6 +24,20 @@ typename Traits::Map& TFieldMap<Traits>::operator=(const TFieldMap& other) {
 }
 
 template <class Traits>
+TFieldMap<Traits>::TFieldMap(TFieldMap&& other) : TFieldMap() {
+  swap(other);
+}
+
+template <class Traits>
+typename Traits::Map& TFieldMap<Traits>::operator=(TFieldMap&& other) {
+  if (this != &other) {
+    clear();
+    swap(other);
+  }
+  return *this->GetThisAsFinalClass();
+}
+
+template <class Traits>
 void TFieldMap<Traits>::swap(TFieldMap& other) {
   using std::swap;
   MutationScope scope(this->GetThisAsFinalClass());

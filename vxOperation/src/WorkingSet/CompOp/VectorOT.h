@@ -8,6 +8,7 @@
 #include "vxOT/TPToQMap.h"
 #include "vxOT/VectorInsertions.h"
 #include "vxOT/VectorInsertionsAndDeletions.h"
+#include "vxOperation/src/WorkingSet/CompOp/FieldMapFill.h"
 #include "vxOperation/src/WorkingSet/CompOp/FieldMapInstance.h"
 #include "vxOperation/src/WorkingSet/CompOp/FieldMapRecords.h"
 
