@@ -3,10 +3,12 @@
 #include <unordered_set>
 #include <vector>
 
+#include "history/meta_number.h"
 #include "history/recorder.h"
 #include "history/replay.h"
 #include "platform/error.h"
 #include "store/snapshot.h"
+#include "vxUtils/ByteForms.h"
 
 namespace vemo {
 
@@ -18,7 +20,7 @@ struct SiteTexts {
   std::string text;
   std::vector<std::uint64_t> ends;
 
-  // Nothing where the number is not the site's or deleted something.
+  // Nothing where the site has not inserted an element with that number.
   std::string_view Element(ssize_t number) const {
     const ssize_t i = number - start;
     if (i < 0 || i >= static_cast<ssize_t>(ends.size())) return {};
@@ -34,8 +36,9 @@ class TextCollector : public EditVisitor {
       : m_snapshot(snapshot), m_prefix(std::move(prefix)) {}
 
   void OnSite(const Guid& site, std::string_view) override {
-    const auto start = m_snapshot.Meta(m_prefix + "start/" + GuidText(site));
-    m_texts[site].start = start ? std::stol(*start) : 0;
+    const std::string name = m_prefix + "start/" + GuidText(site);
+    const auto start = m_snapshot.Meta(name);
+    m_texts[site].start = start ? static_cast<ssize_t>(ParseMetaNumber(name, *start)) : 0;
   }
   void OnObject(OID, std::string_view) override {}
   void OnCommit(const Commit&) override {}
@@ -62,10 +65,14 @@ class TextCollector : public EditVisitor {
   std::unordered_set<FieldId, FieldIdHash> m_fields;
 };
 
-// The live elements of a field, one after another.
-std::string Rebuild(const TextCollector& texts, const VectorInsertions& insertions,
-                    const VectorTombstones* tombstones) {
-  std::string content;
+struct Rebuilt {
+  std::string content;   // the live elements one after another
+  std::string stranger;  // the first live element that the source has not inserted, for messages
+};
+
+Rebuilt Rebuild(const TextCollector& texts, const VectorInsertions& insertions,
+                const VectorTombstones* tombstones) {
+  Rebuilt rebuilt;
   ssize_t next = 0;  // the tombstone run at or behind q
   const ssize_t runs = tombstones == nullptr ? 0 : tombstones->m_tombstones.size();
   for (const auto* run = insertions.m_c.m_first; run != nullptr; run = run->m_next) {
@@ -74,10 +81,15 @@ std::string Rebuild(const TextCollector& texts, const VectorInsertions& insertio
       const ssize_t q = run->m_q + i;
       while (next < runs && tombstones->m_tombstones[next].t2 <= q) ++next;
       const bool isTombstone = next < runs && tombstones->m_tombstones[next].t1 <= q;
-      if (!isTombstone && site != nullptr) content += site->Element(run->m_opid.t + i);
+      if (isTombstone) continue;
+      const Opid opid{run->m_opid.s, run->m_opid.t + i};
+      const std::string_view element = site == nullptr ? std::string_view() : site->Element(opid.t);
+      rebuilt.content += element;
+      if (element.empty() && rebuilt.stranger.empty())
+        rebuilt.stranger = "element " + ToText(opid) + " at " + std::to_string(q);
     }
   }
-  return content;
+  return rebuilt;
 }
 
 std::string Excerpt(const std::string& text, std::size_t at) {
@@ -86,14 +98,20 @@ std::string Excerpt(const std::string& text, std::size_t at) {
   return at >= text.size() ? "its end" : "\"" + excerpt + "\"";
 }
 
-std::string Difference(const FinalContent& expected, const std::string& rebuilt) {
-  const auto differs =
-      std::mismatch(expected.bytes.begin(), expected.bytes.end(), rebuilt.begin(), rebuilt.end());
+// How the maps differ from what the source says of a field, or nothing.
+std::optional<std::string> Difference(const FinalContent& expected, const Rebuilt& rebuilt) {
+  const std::string field = "field " + FieldIdText(expected.field) + " (" + expected.label + ")";
+  if (rebuilt.content == expected.bytes) {
+    if (rebuilt.stranger.empty()) return std::nullopt;
+    return field + " differs: " + rebuilt.stranger + " is none that the source inserted";
+  }
+  const auto differs = std::mismatch(expected.bytes.begin(), expected.bytes.end(), rebuilt.content.begin(),
+                                     rebuilt.content.end());
   const auto at = static_cast<std::size_t>(differs.first - expected.bytes.begin());
   const auto line = 1 + std::count(expected.bytes.begin(), differs.first, '\n');
-  return "field " + FieldIdText(expected.field) + " (" + expected.label + ") differs at byte " +
-         std::to_string(at) + ", line " + std::to_string(line) + ": the source has " +
-         Excerpt(expected.bytes, at) + ", the maps give " + Excerpt(rebuilt, at);
+  return field + " differs at byte " + std::to_string(at) + ", line " + std::to_string(line) +
+         ": the source has " + Excerpt(expected.bytes, at) + ", the maps give " +
+         Excerpt(rebuilt.content, at);
 }
 
 }  // namespace
@@ -105,21 +123,27 @@ std::optional<std::string> CheckReplay(CSpace& space, EditSource& source) {
   TextCollector texts(snapshot, ReplayMetaPrefix(source));
   source.Replay(texts);
 
-  const auto rebuild = [&](const FieldId& field) {
-    const VectorInsertions* stored = insertions.rFind(field);
-    return stored == nullptr ? std::string() : Rebuild(texts, *stored, tombstones.rFind(field));
+  const auto compare = [&](const FinalContent& expected) {
+    const VectorInsertions* stored = insertions.rFind(expected.field);
+    return Difference(
+        expected, stored == nullptr ? Rebuilt() : Rebuild(texts, *stored, tombstones.rFind(expected.field)));
   };
   std::optional<std::string> difference;
   std::unordered_set<FieldId, FieldIdHash> compared;
   source.ForEachFinalContent([&](const FinalContent& expected) {
     compared.insert(expected.field);
-    const std::string rebuilt = rebuild(expected.field);
-    if (!difference && rebuilt != expected.bytes) difference = Difference(expected, rebuilt);
+    if (!difference) difference = compare(expected);
   });
   for (const FieldId& field : texts.Fields()) {
-    if (difference || compared.contains(field)) continue;
-    const std::string rebuilt = rebuild(field);
-    if (!rebuilt.empty()) difference = Difference({field, "deleted in the source", ""}, rebuilt);
+    if (difference) return difference;
+    if (!compared.contains(field)) difference = compare({field, "deleted in the source", ""});
+  }
+  if (source.OnlyField()) return difference;
+  // A repository has the space to itself.
+  for (const auto& [field, stored] : insertions) {
+    if (difference) return difference;
+    if (!texts.Fields().contains(field))
+      difference = "field " + FieldIdText(field) + " is in the maps, but not in the source";
   }
   return difference;
 }

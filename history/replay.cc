@@ -1,8 +1,7 @@
 #include "history/replay.h"
 
-#include <charconv>
-
 #include "history/edit_digest.h"
+#include "history/meta_number.h"
 #include "history/recorder.h"
 #include "platform/error.h"
 #include "store/transaction.h"
@@ -10,15 +9,6 @@
 namespace vemo {
 
 namespace {
-
-std::uint64_t ParseCount(const std::string& name, const std::string& text) {
-  std::uint64_t value = 0;
-  const auto result = std::from_chars(text.data(), text.data() + text.size(), value);
-  if (result.ec != std::errc() || result.ptr != text.data() + text.size()) {
-    throw UsageError("meta value \"" + name + "\" should be a number, not \"" + text + "\"");
-  }
-  return value;
-}
 
 // Feeds a recorder, a transaction a batch.
 class Replayer : public EditVisitor {
@@ -43,11 +33,11 @@ class Replayer : public EditVisitor {
     const std::string startName = m_prefix + "start/" + GuidText(site);
     const std::string nextName = NextNumberMetaName(site);
     if (const auto start = m_txn->Meta(startName)) {
-      m_numbers.SetNext(site, static_cast<ssize_t>(ParseCount(startName, *start)));
+      m_numbers.SetNext(site, static_cast<ssize_t>(ParseMetaNumber(startName, *start)));
       return;
     }
     const auto next = m_txn->Meta(nextName);
-    m_numbers.SetNext(site, next ? static_cast<ssize_t>(ParseCount(nextName, *next)) : 0);
+    m_numbers.SetNext(site, next ? static_cast<ssize_t>(ParseMetaNumber(nextName, *next)) : 0);
     m_txn->SetMeta(startName, std::to_string(m_numbers.Next(site)));
     m_txn->SetMeta(SiteMetaName(site), author);
   }
@@ -124,7 +114,7 @@ class Replayer : public EditVisitor {
   void Start() {
     const auto applied = m_txn->Meta(m_prefix + "edits");
     if (applied && m_options.resume) {
-      m_applied = ParseCount(m_prefix + "edits", *applied);
+      m_applied = ParseMetaNumber(m_prefix + "edits", *applied);
       m_digestApplied = m_txn->Meta(m_prefix + "digest").value_or("");
       return;
     }
@@ -147,7 +137,7 @@ class Replayer : public EditVisitor {
     for (const auto& [site, next] : m_numbers.All()) {
       const std::string name = NextNumberMetaName(site);
       const auto stored = m_txn->Meta(name);
-      if (stored && static_cast<ssize_t>(ParseCount(name, *stored)) != next) {
+      if (stored && static_cast<ssize_t>(ParseMetaNumber(name, *stored)) != next) {
         throw UsageError(m_space.Name() + ": site " + GuidText(site) +
                          " has recorded other operations since this replay stopped, so it cannot be resumed");
       }

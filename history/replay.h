@@ -48,7 +48,8 @@ struct ReplayReport {
 ReplayReport Replay(CSpace& space, EditSource& source, const ReplayOptions& options);
 
 // Rebuilds the content of every field of the source from the stored maps and the inserted texts, and compares it with the
-// source's own final content, byte for byte. Returns what differs first, or nothing. Holds the inserted texts in memory.
+// source's own final content, byte for byte; live elements and, for a repository, fields that are none of the source's
+// differ as well. Returns what differs first, or nothing. Holds the inserted texts in memory.
 std::optional<std::string> CheckReplay(CSpace& space, EditSource& source);
 
 // The names of meta values.

@@ -105,10 +105,13 @@ class HistoryCheck {
   void CheckNumbers() {
     for (auto& [site, ranges] : m_numbers) {
       std::sort(ranges.begin(), ranges.end(), [](const auto& a, const auto& b) { return a.first < b.first; });
+      const NumberRange* reaching = &ranges.front();  // of those so far, the one with the last number
       for (std::size_t i = 1; i < ranges.size(); ++i) {
-        Expect(ranges[i - 1].first + ranges[i - 1].count <= ranges[i].first, ranges[i].field,
-               "site " + site + " has used number " + std::to_string(ranges[i].first) +
-                   " twice, also in field " + FieldIdText(ranges[i - 1].field));
+        const NumberRange& range = ranges[i];
+        Expect(reaching->first + reaching->count <= range.first, range.field,
+               "site " + site + " has used number " + std::to_string(range.first) + " twice, also in field " +
+                   FieldIdText(reaching->field));
+        if (range.first + range.count > reaching->first + reaching->count) reaching = &range;
       }
     }
   }
