@@ -8,6 +8,7 @@
 #include "history/edit_source.h"
 #include "history/recorder.h"
 #include "history/replay.h"
+#include "history/source_error.h"
 #include "platform/error.h"
 #include "store/snapshot.h"
 #include "tool/commands.h"
@@ -58,7 +59,7 @@ void PrintMaps(Snapshot& snapshot) {
 
 void PrintReport(const ReplayReport& report, double seconds) {
   const auto row = [](const char* what, std::uint64_t count, const std::string& note) {
-    fmt::print("  {:<18} {:>14}  {}\n", what, Grouped(count), note);
+    fmt::print("  {:<18} {:>14}{}{}\n", what, Grouped(count), note.empty() ? "" : "  ", note);
   };
   row("edits", report.edits,
       report.editsApplied == report.edits ? "" : fmt::format("of which {} now", Grouped(report.editsApplied)));
@@ -110,7 +111,7 @@ ExitCode RunReplay(const ReplayArguments& arguments) {
   }
   if (!arguments.check) return kGood;
   if (const std::optional<std::string> difference = CheckReplay(*space, *source)) {
-    fmt::print("{}\n", *difference);
+    fmt::print("{}\n", OneLine(*difference));
     return kFinding;
   }
   fmt::print("content matches\n");
@@ -130,7 +131,8 @@ void AddReplayCommand(CLI::App& app, Command& chosen) {
   command->add_option("--rev", arguments->revision, "The commit up to which the repository is replayed")
       ->capture_default_str();
   command->add_option("--batch", arguments->batch, "Commit after this many edits")
-      ->check(CLI::PositiveNumber)
+      ->check(CLI::Validator([](const std::string& text) { return text == "0" ? "a batch has at least 1 edit" : ""; },
+                             "POSITIVE"))
       ->capture_default_str();
   command->add_flag("--resume", arguments->resume, "Go on after the last edit that the space has recorded");
   command->add_flag("--check", arguments->check,
