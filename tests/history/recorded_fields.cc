@@ -22,6 +22,14 @@ std::string ListText(const List& runs) {
   return text;
 }
 
+// The node behind which to append; null in an empty list.
+template <class List>
+auto* LastOf(const List& runs) {
+  auto* last = runs.m_first;
+  while (last != nullptr && last->m_next != nullptr) last = last->m_next;
+  return last;
+}
+
 }  // namespace
 
 Guid Site(char name) {
@@ -40,6 +48,24 @@ std::string RunsText(const VectorInsertions::List& runs) {
 }
 std::string RunsText(const VectorDeletions& runs) {
   return ListText(runs);
+}
+
+void AppendRun(VectorInsertions& insertions, const Opid& first, ssize_t n) {
+  VectorInsertionInterval run;
+  run.m_opid = first;
+  run.m_q = insertions.m_u2;
+  run.m_n = n;
+  run.m_u = first.t + n - 1;
+  insertions.m_c.InsertAfter(LastOf(insertions.m_c), run);
+  insertions.m_u2 += n;
+}
+
+void AppendRun(VectorDeletions& deletions, const Opid& first, ssize_t q, ssize_t n) {
+  VectorDeletionInterval run;
+  run.m_opid = first;
+  run.m_q = q;
+  run.m_n = n;
+  deletions.InsertAfter(LastOf(deletions), run);
 }
 
 PayloadBytes CommittedBytes(CSpace& space) {

@@ -22,6 +22,12 @@ FieldId Field(std::uint64_t object, Path::Element step = 0);
 std::string RunsText(const VectorInsertions::List& runs);
 std::string RunsText(const VectorDeletions& runs);
 
+// Adds a run of `n` elements behind the last one, as if `first` and the operations after it had inserted
+// them.
+void AppendRun(VectorInsertions& insertions, const Opid& first, ssize_t n);
+// Adds a run of deleted elements behind the last one in the list.
+void AppendRun(VectorDeletions& deletions, const Opid& first, ssize_t q, ssize_t n);
+
 // The bytes of every payload under the name of its map and its field.
 using PayloadBytes = std::map<std::string, Bytes>;
 

@@ -44,13 +44,7 @@ class RecorderRefusalTest : public ::testing::Test {
   // A field of `length` elements, all of one run and live.
   void MakeField(const FieldId& field, ssize_t length) {
     VectorInsertions insertions;
-    insertions.m_u2 = length;
-    VectorInsertionInterval run;
-    run.m_opid = {Site('Z'), 0};
-    run.m_q = 0;
-    run.m_n = length;
-    run.m_u = length - 1;
-    insertions.m_c.InsertAfter(nullptr, run);
+    AppendRun(insertions, {Site('Z'), 0}, length);
     VectorInsertionsAndDeletions history;
     history.m_insertions = insertions;
     m_recorded.insertions().Insert(field, insertions, true);
