@@ -33,13 +33,6 @@ constexpr const char* kTwoParents = "(([1 2] 3 [3 4] 5 [5 6]) 10 ([10 11] 12 [12
 constexpr const char* kLeafCount = "0 <= nk && nk <= 100";
 constexpr const char* kInternalCount = "1 <= nk && nk <= 100";
 
-TEST_F(Assertion, TellsTheFunctionItStandsIn) {
-  EXPECT_ASSERTION_IN(SmallMap::LeafNode().m_prev.GetNotNull(),
-                      "vemo::ptr<vemo::IPersistable> vemo::prefbase::GetNotNullAs(const "
-                      "vemo::IPersistable::FnTable*) const",
-                      "m_ptr");
-}
-
 TEST_F(Assertion, SearchesWantALeafWithASoundCount) {
   Build(kTwoLeaves);
   EXPECT_ASSERTION(map.SearchLeaf(Key(1), nullptr), "leaf");
@@ -281,8 +274,8 @@ TEST_F(Assertion, EqualityWantsSizesThatAreTrue) {
   Build("[1 2]");
   Hosted<SmallMap> other(host, "other");
   TreeBuilder<SmallMap>::Build(*other, "[1]");
-  EXPECT_ASSERTION((other->m_size = 2, map == *other), "j != rhs.end()");
-  EXPECT_ASSERTION((map.m_size = 1, *other == map), "j == rhs.end()");
+  EXPECT_ASSERTION((other->m_size = 2, static_cast<void>(map == *other)), "j != rhs.end()");
+  EXPECT_ASSERTION((map.m_size = 1, static_cast<void>(*other == map)), "j == rhs.end()");
 }
 
 }  // namespace

@@ -4,10 +4,12 @@
 #include <functional>
 #include <new>
 #include <utility>
+#include <vector>
 
 #include "tests/module/map_fixture.h"
 #include "tests/support/failing_allocator.h"
 #include "tests/support/small_map.h"
+#include "vxOperation/src/WorkingSet/CompOp/FieldMapFill.h"
 
 namespace vemo::test {
 namespace {
@@ -127,6 +129,32 @@ const Scenario kScenarios[] = {
        const SmallMap& same = map;
        begin();
        map = same;
+     }},
+    {"MoveAssignment", kTwoParents,
+     [](SmallMap& map, Beginning& begin) {
+       begin();
+       map = SmallMap();
+     }},
+    {"InsertionOfAPayloadToBeMoved", "[1 3 4 5]",
+     [](SmallMap& map, Beginning& begin) {
+       const FieldId key = LongKey(2);
+       CountedPayload payload(7);
+       begin();
+       map.Insert(key, std::move(payload), false);
+     }},
+    {"Edit", "([1 2] 3 [3 4])",
+     [](SmallMap& map, Beginning& begin) {
+       const FieldId key = LongKey(3);
+       begin();
+       map.Edit(key, [](CountedPayload& payload) { payload = CountedPayload(7); });
+     }},
+    {"BulkLoad", "[]",
+     [](SmallMap& map, Beginning& begin) {
+       std::vector<std::pair<FieldId, CountedPayload>> entries;
+       entries.reserve(13);
+       for (std::uint32_t n = 1; n <= 13; ++n) entries.emplace_back(LongKey(n), CountedPayload(n));
+       begin();
+       map.BulkLoad(entries.begin(), entries.end(), 0.75);
      }},
     {"WriteLookUpWithoutCreation", "([1 2] 3 [3 4])",
      [](SmallMap& map, Beginning& begin) {

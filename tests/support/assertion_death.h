@@ -32,6 +32,3 @@ inline std::string Literally(const std::string& text) {
 #endif
 #define EXPECT_ASSERTION(statement, text) \
   VEMO_EXPECT_DEATH(statement, ::vemo::test::Literally(std::string(": assertion failed: ") + (text) + "\n"))
-#define EXPECT_ASSERTION_IN(statement, function, text)                                  \
-  VEMO_EXPECT_DEATH(statement, ::vemo::test::Literally(std::string(": ") + (function) + \
-                                                       ": assertion failed: " + (text) + "\n"))
