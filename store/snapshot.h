@@ -42,6 +42,9 @@ class Snapshot {
   // The number of commits that the space has had.
   std::uint64_t Generation() const noexcept { return m_view.Generation(); }
   View& Objects() noexcept { return m_view; }
+  CSpace& Space() const noexcept { return m_space; }
+  // How many snapshots this process has open on the space, this one included. Thread-safe.
+  std::size_t NumOpenOnSpace() const;
 
   // Forgets the view's objects if `object` is one of them.
   void ForgetIfHolds(ptr<const IPersistable> object) noexcept;
