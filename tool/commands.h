@@ -17,5 +17,7 @@ using Command = std::function<ExitCode()>;
 void AddReplayCommand(CLI::App& app, Command& chosen);
 void AddDumpCommand(CLI::App& app, Command& chosen);
 void AddVerifyCommand(CLI::App& app, Command& chosen);
+void AddStatsCommand(CLI::App& app, Command& chosen);
+void AddBlameCommand(CLI::App& app, Command& chosen);
 
 }  // namespace vemo::tool

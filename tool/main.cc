@@ -42,6 +42,8 @@ int main(int argc, char** argv) {
   vemo::tool::AddReplayCommand(app, chosen);
   vemo::tool::AddDumpCommand(app, chosen);
   vemo::tool::AddVerifyCommand(app, chosen);
+  vemo::tool::AddStatsCommand(app, chosen);
+  vemo::tool::AddBlameCommand(app, chosen);
   try {
     app.parse(argc, argv);
   } catch (const CLI::Success& asked) {
