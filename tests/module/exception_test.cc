@@ -130,6 +130,12 @@ const Scenario kScenarios[] = {
        begin();
        map = same;
      }},
+    {"Swap", kTwoParents,
+     [](SmallMap& map, Beginning& begin) {
+       SmallMap other;
+       begin();
+       map.swap(other);
+     }},
     {"MoveAssignment", kTwoParents,
      [](SmallMap& map, Beginning& begin) {
        begin();
@@ -243,6 +249,24 @@ TEST_P(Interruption, ByAFailedAllocationLeaksNothingAndIsReported) {
 }
 
 INSTANTIATE_TEST_SUITE_P(Operations, Interruption, ::testing::ValuesIn(kScenarios), NameOfScenario);
+
+TEST(InternalSplits, FreeTheKeyThatTheSplitEntryHeld) {
+  const std::int64_t allocations = LiveAllocations();
+  {
+    RecordingHost host;
+    Hosted<SmallMap> map(host);
+    TreeBuilder<SmallMap>::Build(*map, "([1 2] 10 [10 11] 20 [20 21] 30 [30 31] 40 [40 41])", LongKey);
+    SmallMapInternalKeyEntry entry;
+    entry.m_key = LongKey(50);
+    entry.m_ptr = host.Find<SmallMapLeafNode>("leaf1");
+    SmallMapInternalKeyEntry splitEntry;
+    splitEntry.m_key = LongKey(99);
+    map->InsertIntoInternalNode(host.Find<SmallMapInternalNode>("node1"), entry, splitEntry);
+    EXPECT_EQ(splitEntry.m_key, LongKey(30));
+    EXPECT_EQ(splitEntry.m_ptr.Get(), host.Find("node2"));
+  }
+  EXPECT_EQ(LiveAllocations(), allocations);
+}
 
 }  // namespace
 }  // namespace vemo::test
