@@ -114,9 +114,11 @@ void CommitBuilder::SweepQueue(std::size_t limit) {
     if (!record) continue;
     m_batch.removedRecords.push_back(oid);
     try {
-      const ptr<IPersistable> object = m_view.Decode(oid, *record);
-      for (const prefbase& child : OwnedReferences(object)) m_batch.queuedDeletions.push_back(child.m_oid);
-      DestroyObject(object);
+      struct Destroyer {
+        ptr<IPersistable> object;
+        ~Destroyer() { DestroyObject(object); }
+      } const decoded{m_view.Decode(oid, *record)};
+      for (const prefbase& child : OwnedReferences(decoded.object)) m_batch.queuedDeletions.push_back(child.m_oid);
     } catch (const CorruptRecord&) {
       continue;
     }

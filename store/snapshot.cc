@@ -82,17 +82,15 @@ void Snapshot::ScanMeta(std::string_view prefix,
   ScanStoredMeta(m_view.State(), m_space.Name(), prefix, visit);
 }
 
-void Snapshot::ForgetIfHolds(ptr<const IPersistable> object) noexcept {
-  const OID oid = PersistStateOf(object).m_oid;
-  bool holds = m_view.Find(oid).m_self == object.m_self;
-  for (const auto& [name, root] : m_view.Roots()) holds = holds || root.map.m_self == object.m_self;
-  if (!holds) return;
+bool Snapshot::ForgetIfHolds(OID oid, const void* self) noexcept {
+  if (!m_view.Holds(oid, self)) return false;
   m_view.ForgetResidents();
   try {
     m_view.ReloadRoots();
   } catch (const std::exception&) {
     // The roots stay stale, and whoever asks for one next gets the exception.
   }
+  return true;
 }
 
 }  // namespace vemo

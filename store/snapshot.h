@@ -46,8 +46,8 @@ class Snapshot {
   // How many snapshots this process has open on the space, this one included. Thread-safe.
   std::size_t NumOpenOnSpace() const;
 
-  // Forgets the view's objects if `object` is one of them.
-  void ForgetIfHolds(ptr<const IPersistable> object) noexcept;
+  // Forgets the view's objects if the one of that id and address is among them, and returns whether it was.
+  bool ForgetIfHolds(OID oid, const void* self) noexcept;
 
  private:
   [[noreturn]] void RefuseRoot(std::string_view name, const IPersistable::FnTable* table);

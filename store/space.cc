@@ -41,6 +41,14 @@ std::unique_ptr<CSpace> CSpace::Open(std::string_view uri, const SpaceOptions& o
   return space;
 }
 
+std::unique_ptr<CSpace> CSpace::OpenOn(std::unique_ptr<Engine> engine, const SpaceOptions& options) {
+  RegisterMapClasses();
+  std::string name = engine->Name();
+  std::unique_ptr<CSpace> space(new CSpace(std::move(name), std::move(engine), options));
+  space->CheckFormat(options.create);
+  return space;
+}
+
 CSpace::CSpace(std::string name, std::unique_ptr<Engine> engine, const SpaceOptions& options)
     : m_name(std::move(name)),
       m_engine(std::move(engine)),
@@ -49,7 +57,8 @@ CSpace::CSpace(std::string name, std::unique_ptr<Engine> engine, const SpaceOpti
 
 CSpace::~CSpace() {
   VEMO_ASSERT_TEXT(m_snapshots.empty(), "no snapshot is open when its space is closed");
-  VEMO_ASSERT_TEXT(m_writerMutex.try_lock(), "no transaction is open when its space is closed");
+  const std::unique_lock idle(m_writerMutex, std::try_to_lock);
+  VEMO_ASSERT_TEXT(idle.owns_lock(), "no transaction is open when its space is closed");
 }
 
 std::string CSpace::OptionsText() const {
@@ -102,7 +111,10 @@ void CSpace::RefuseMark(ptr<const IPersistable> object) {
   if (state.GetFlag(kSnapshotFlag)) {
     const std::string message = m_writerView.Describe(oid, className, "it belongs to a snapshot, which cannot be changed");
     const std::lock_guard lock(m_snapshotsMutex);
-    for (Snapshot* snapshot : m_snapshots) snapshot->ForgetIfHolds(object);
+    // The one that holds it ends it, so it must not be looked at any more. The others may be in use by other threads.
+    for (Snapshot* snapshot : m_snapshots) {
+      if (snapshot->ForgetIfHolds(oid, object.m_self)) break;
+    }
     throw UsageError(message);
   }
   const std::string message = m_writerView.Describe(

@@ -29,6 +29,9 @@ class CSpace {
   // Throws UsageError for a URI that names no space, SpaceNotFound, SpaceBusy when this process has it open already,
   // IncompatibleSpace, or another StoreError.
   static std::unique_ptr<CSpace> Open(std::string_view uri, const SpaceOptions& options = {});
+  // Opens the space in an engine of one's own, which the handle takes. A space that has no commit yet is made if
+  // `options.create` says so. Throws SpaceNotFound, IncompatibleSpace, CorruptRecord, or what the engine throws.
+  static std::unique_ptr<CSpace> OpenOn(std::unique_ptr<Engine> engine, const SpaceOptions& options = {});
   ~CSpace();
   CSpace(const CSpace&) = delete;
   CSpace& operator=(const CSpace&) = delete;

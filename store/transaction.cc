@@ -1,5 +1,6 @@
 #include "store/transaction.h"
 
+#include <algorithm>
 #include <utility>
 
 #include "platform/error.h"
@@ -48,7 +49,12 @@ WriteTransaction::WriteTransaction(CSpace& space) : m_space(space) {
     throw SpaceBusy(space.Name() + ": another thread's transaction is still open; try again");
   }
   m_engineLock = space.m_engine->LockWriter(space.m_options.writerTimeout);
-  space.m_writerView.Attach(space.m_engine->OpenSnapshot());
+  try {
+    space.m_writerView.Attach(space.m_engine->OpenSnapshot());
+  } catch (...) {
+    space.m_writerView.Detach();  // an open state would keep the engine from growing
+    throw;
+  }
   m_open = true;
   t_transaction = this;
 }
@@ -94,6 +100,9 @@ void WriteTransaction::RequireOpen() const {
 
 vemo::View::Root* WriteTransaction::FindRootOfClass(std::string_view name, const ClassEntry& classEntry) {
   RequireOpen();
+  for (const RemovedRoot& removed : m_removedRoots) {
+    if (removed.name == name) return nullptr;  // the engine's state still has it
+  }
   vemo::View::Root* root = m_space.m_writerView.FindRoot(name);
   if (root != nullptr && root->classEntry != &classEntry) {
     throw UsageError(m_space.Name() + ": root \"" + std::string(name) + "\" is a " +
@@ -130,9 +139,18 @@ void* WriteTransaction::MakeOwnedRoot(const IPersistable::FnTable* table) {
   return m_space.m_writerView.AddRoot(OwnedRootName(oid), MapClass(table), oid).map.m_self;
 }
 
+OID WriteTransaction::RequireOwnedRoot(ptr<const IPersistable> map) {
+  RequireOpen();
+  RequireOwn(map);
+  const OID oid = PersistStateOf(map).m_oid;
+  if (m_space.m_writerView.FindRoot(OwnedRootName(oid)) == nullptr) {
+    throw UsageError(m_space.m_writerView.Describe(oid, "", "it is a root with a name, not a map that was made by Own"));
+  }
+  return oid;
+}
+
 void WriteTransaction::RemoveOwnedRoot(OID oid) {
   vemo::View::Root* root = m_space.m_writerView.FindRoot(OwnedRootName(oid));
-  if (root == nullptr) throw UsageError(m_space.Name() + ": object " + std::to_string(oid.m_value) + " is no owned map");
   m_removedRoots.push_back({OwnedRootName(oid), oid, root->committed});
   m_dirty.erase(oid);
   SysStateOf(root->map).ClearFlag(ObjSysState::kDirtyFlag);
@@ -236,10 +254,9 @@ void WriteTransaction::CheckReachable(ptr<const IPersistable> from, ptr<const IP
 void WriteTransaction::DeleteObject(ptr<IPersistable> object) {
   RequireOwn(object);
   const OID oid = PersistStateOf(object).m_oid;
-  m_deleted.reserve(m_deleted.size() + 1);
   m_deletedIds.insert(oid);
-  const bool hasRecord = m_new.erase(oid) == 0;
-  m_deleted.push_back({oid, object, hasRecord});
+  m_deleted.push_back({oid, object, !m_new.contains(oid)});  // the last step that can throw
+  m_new.erase(oid);
   m_dirty.erase(oid);
   m_space.m_writerView.Release(oid);
   ObjSysState& state = SysStateOf(object);
@@ -249,21 +266,61 @@ void WriteTransaction::DeleteObject(ptr<IPersistable> object) {
 
 // What is in memory is deleted now, since nodes there may be changed or new; what is not is clean, and its id is queued:
 // later commits delete it a slice at a time.
+//
+// A leaf is also reached along the chain of leaves, so a changed one can be in memory below nodes that are not. While the
+// transaction has changed nodes left, the internal nodes are read to see whether it is they that hang there.
 void WriteTransaction::DeleteSubTree(ptr<IPersistable> root) {
+  std::vector<std::vector<OID>> absent;  // children that are not in memory, those of one node together
+  DeleteResidents(root, absent);
+  while (!absent.empty() && HasDirtyNodes()) {
+    std::vector<OID> siblings = std::move(absent.back());
+    absent.pop_back();
+    bool areLeaves = false;
+    while (!siblings.empty() && !areLeaves) {
+      const ptr<IPersistable> node = LoadForDeletion(siblings.back());
+      if (node.m_self == nullptr) m_queuedDeletions.push_back(siblings.back());
+      siblings.pop_back();
+      if (node.m_self == nullptr) continue;
+      areLeaves = OwnedReferences(node).empty();
+      DeleteResidents(node, absent);
+    }
+    m_queuedDeletions.insert(m_queuedDeletions.end(), siblings.begin(), siblings.end());
+  }
+  for (const std::vector<OID>& siblings : absent) {
+    m_queuedDeletions.insert(m_queuedDeletions.end(), siblings.begin(), siblings.end());
+  }
+}
+
+void WriteTransaction::DeleteResidents(ptr<IPersistable> root, std::vector<std::vector<OID>>& absent) {
   std::vector<ptr<IPersistable>> pending{root};
   while (!pending.empty()) {
     const ptr<IPersistable> object = pending.back();
     pending.pop_back();
+    std::vector<OID> missing;
     for (const prefbase& child : OwnedReferences(object)) {
       const ptr<IPersistable> resident = m_space.m_writerView.Find(child.m_oid);
       if (resident.m_self != nullptr) {
         pending.push_back(resident);
       } else if (!m_deletedIds.contains(child.m_oid)) {
-        m_queuedDeletions.push_back(child.m_oid);
+        missing.push_back(child.m_oid);
       }
     }
+    if (!missing.empty()) absent.push_back(std::move(missing));
     DeleteObject(object);
   }
+}
+
+// Null for an object that cannot be read: whoever works off the queue deletes it all the same.
+ptr<IPersistable> WriteTransaction::LoadForDeletion(OID oid) {
+  try {
+    return m_space.m_writerView.Resolve(oid, nullptr);
+  } catch (const CorruptRecord&) {
+    return {};
+  }
+}
+
+bool WriteTransaction::HasDirtyNodes() const noexcept {
+  return std::any_of(m_dirty.begin(), m_dirty.end(), [](const auto& entry) { return !FindClass(entry.second.Table())->isMap; });
 }
 
 // --- Commit ---

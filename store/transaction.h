@@ -58,7 +58,7 @@ class WriteTransaction {
   }
   template <class Map>
   void Disown(Map& map) {
-    const OID oid = map.GetPersistObjState().m_oid;
+    const OID oid = RequireOwnedRoot(ptr<const IPersistable>(&map));
     map.clear();
     RemoveOwnedRoot(oid);
   }
@@ -105,9 +105,14 @@ class WriteTransaction {
   void* FindOrMakeRoot(std::string_view name, const IPersistable::FnTable* table);
   void* FindExistingRoot(std::string_view name, const IPersistable::FnTable* table);
   void* MakeOwnedRoot(const IPersistable::FnTable* table);
+  OID RequireOwnedRoot(ptr<const IPersistable> map);
   void RemoveOwnedRoot(OID oid);
   vemo::View::Root* FindRootOfClass(std::string_view name, const ClassEntry& classEntry);
   void* MakeRoot(std::string_view name, const ClassEntry& classEntry);
+
+  void DeleteResidents(ptr<IPersistable> root, std::vector<std::vector<OID>>& absent);
+  ptr<IPersistable> LoadForDeletion(OID oid);
+  bool HasDirtyNodes() const noexcept;
 
   bool HasChanges() const noexcept;
   void AddRemovedRoots(CommitBatch& batch) const;

@@ -1,6 +1,7 @@
 #include "store/view.h"
 
 #include <algorithm>
+#include <charconv>
 #include <utility>
 
 #include "platform/error.h"
@@ -25,8 +26,18 @@ class ReadingScope {
 };
 
 constexpr std::string_view kClassPrefix = "class/";
+constexpr std::size_t kMaxClassNumber = 1'000'000;  // far above what classes there can be, and an array that long is small
 
 std::string ClassNumberName(std::size_t number) { return std::string(kClassPrefix) + std::to_string(number); }
+
+std::size_t ParseClassNumber(std::string_view text) {
+  std::size_t number = 0;
+  const auto result = std::from_chars(text.data(), text.data() + text.size(), number);
+  if (result.ec != std::errc() || result.ptr != text.data() + text.size() || number == 0 || number > kMaxClassNumber) {
+    throw MalformedBytes(0, "its name ends in no class number");
+  }
+  return number;
+}
 
 RootValue DecodeRootValue(std::string_view name, ByteView sealed) {
   const ByteView value = OpenNamed(NamedTable::kRoots, name, sealed);
@@ -110,9 +121,23 @@ void View::Own(ptr<IPersistable> object, OID oid) noexcept {
   PersistStateOf(object).m_oid = oid;
 }
 
+bool View::Holds(OID oid, const void* self) const {
+  const std::lock_guard lock(m_tablesMutex);
+  const auto isRoot = [self](const auto& entry) { return entry.second.map.m_self == self; };
+  return Find(oid).m_self == self || std::any_of(m_roots.begin(), m_roots.end(), isRoot);
+}
+
 void View::Adopt(OID oid, ptr<IPersistable> object) {
-  m_residents.emplace(oid, object);
+  {
+    const std::lock_guard lock(m_tablesMutex);
+    m_residents.emplace(oid, object);
+  }
   Own(object, oid);
+}
+
+void View::Release(OID oid) noexcept {
+  const std::lock_guard lock(m_tablesMutex);
+  m_residents.erase(oid);
 }
 
 ptr<IPersistable> View::Resolve(OID oid, const IPersistable::FnTable* expected) {
@@ -167,18 +192,19 @@ ptr<IPersistable> View::Decode(OID oid, ByteView record) {
 // --- Classes ---
 
 void View::ReadClassNumbers() {
-  State().ScanNamed(NamedTable::kInfo, kClassPrefix, [this](std::string_view name, ByteView sealed) {
-    ByteView value;
+  std::vector<const ClassEntry*> classes;  // taken over when all of it was read: a part would give numbers out twice
+  State().ScanNamed(NamedTable::kInfo, kClassPrefix, [&](std::string_view name, ByteView sealed) {
     try {
-      value = OpenNamed(NamedTable::kInfo, name, sealed);
+      const ByteView value = OpenNamed(NamedTable::kInfo, name, sealed);
+      const std::size_t number = ParseClassNumber(name.substr(kClassPrefix.size()));
+      if (classes.size() < number) classes.resize(number);
+      classes[number - 1] = FindClass(std::string_view(reinterpret_cast<const char*>(value.data()), value.size()));
     } catch (const MalformedBytes& malformed) {
       throw CorruptRecord(m_spaceName + ": class table, \"" + std::string(name) + "\": " + malformed.what(), OID());
     }
-    const std::size_t number = std::stoul(std::string(name.substr(kClassPrefix.size())));
-    if (m_classes.size() < number) m_classes.resize(number);
-    m_classes[number - 1] = FindClass(std::string_view(reinterpret_cast<const char*>(value.data()), value.size()));
     return true;
   });
+  m_classes = std::move(classes);
 }
 
 const ClassEntry& View::ClassOf(OID oid, std::uint32_t number) const {
@@ -235,9 +261,11 @@ View::Root* View::FindRoot(std::string_view name) {
 }
 
 View::Root& View::AddRoot(std::string_view name, const ClassEntry& classEntry, OID oid) {
+  const std::lock_guard lock(m_tablesMutex);
   auto found = m_roots.find(name);
   if (found != m_roots.end() && found->second.classEntry != &classEntry) {
     m_retiredRoots.push_back(found->second);
+    m_retiredRoots.back().oid = OID();
     m_roots.erase(found);
     found = m_roots.end();
   }
@@ -289,13 +317,18 @@ void View::ResetInPlace(Root& root) noexcept {
 }
 
 void View::ForgetResidents() noexcept {
-  for (const auto& [oid, object] : m_residents) DestroyObject(object);
-  m_residents.clear();
+  std::unordered_map<OID, ptr<IPersistable>> forgotten;
+  {
+    const std::lock_guard lock(m_tablesMutex);
+    forgotten.swap(m_residents);
+  }
+  for (const auto& [oid, object] : forgotten) DestroyObject(object);
   for (auto& [name, root] : m_roots) {
     if (!root.committed) root.oid = OID();
     ResetInPlace(root);
     m_rootsAreStale = true;
   }
+  for (Root& root : m_retiredRoots) ResetInPlace(root);  // a refused change may have left them half-changed
 }
 
 void View::ReloadRoots() {

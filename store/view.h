@@ -20,6 +20,7 @@
 #include <cstdint>
 #include <map>
 #include <memory>
+#include <mutex>
 #include <string>
 #include <string_view>
 #include <unordered_map>
@@ -86,10 +87,12 @@ class View {
 
   // The resident `oid`, or null.
   ptr<IPersistable> Find(OID oid) const noexcept;
+  // Whether the object of that id and address is a resident or a root map. Unlike the rest, for any thread.
+  bool Holds(OID oid, const void* self) const;
   // Takes a new object in.
   void Adopt(OID oid, ptr<IPersistable> object);
   // Removes a resident without ending it.
-  void Release(OID oid) noexcept { m_residents.erase(oid); }
+  void Release(OID oid) noexcept;
 
   // The root of that name, its map read if need be; null when the space has none.
   Root* FindRoot(std::string_view name);
@@ -127,6 +130,7 @@ class View {
   std::uint64_t m_generation = 0;
   bool m_rootsAreStale = false;
   std::vector<const ClassEntry*> m_classes;  // number - 1 -> class; null where this program does not know it
+  mutable std::mutex m_tablesMutex;  // held where the residents or the roots change, for Holds
   std::unordered_map<OID, ptr<IPersistable>> m_residents;
   std::map<std::string, Root, std::less<>> m_roots;
   std::vector<Root> m_retiredRoots;  // maps whose name now stands for another class
