@@ -1,0 +1,116 @@
+// Three maps under random operations, commits, aborts and reopenings, each beside a std::map that is told the
+// same.
+#include <optional>
+#include <random>
+
+#include "store/verify.h"
+#include "tests/store/store_fixture.h"
+#include "tests/support/seed.h"
+
+namespace vemo::test {
+namespace {
+
+// One root map and its models: of the newest commit, and of the transaction.
+template <class Map>
+class ModelledRoot {
+ public:
+  explicit ModelledRoot(std::string name) : m_name(std::move(name)) {}
+
+  void Begin(WriteTransaction& transaction) {
+    m_map = &transaction.Root<Map>(m_name);
+    m_now = m_committed;
+  }
+  void Committed() { m_committed = m_now; }
+
+  void Change(std::mt19937_64& random) {
+    const std::uint64_t first = 1 + random() % kKeys;
+    const std::uint64_t last = std::min<std::uint64_t>(kKeys, first + random() % 200);
+    const std::uint64_t kind = random() % 100;
+    if (kind < 45) {
+      Fill(*m_map, first, last, kind);
+      for (std::uint64_t n = first; n <= last; ++n) m_now[n] = n + kind;
+    } else if (kind < 90) {
+      for (std::uint64_t n = first; n <= last; ++n) EXPECT_EQ(m_map->Delete(Key(n)), m_now.erase(n) == 1);
+    } else if (kind < 94) {
+      for (auto i = m_map->begin(); i != m_map->end(); ++i) {
+        const std::uint64_t n = NumberOf(i.const_deref().first);
+        if (n % 97 != kind) continue;
+        i->second = PayloadOf<Map>(n);
+        m_now[n] = n;
+      }
+    } else if (kind < 96) {
+      m_map->clear();
+      m_now.clear();
+    } else if (kind < 98) {
+      *m_map = Map(*m_map);
+    } else {
+      Map stack;
+      Fill(stack, first, last);
+      stack.swap(*m_map);
+      stack.clear();
+      m_now.clear();
+      for (std::uint64_t n = first; n <= last; ++n) m_now[n] = n;
+    }
+  }
+
+  void CheckOpen() const { EXPECT_EQ(NumbersOf(std::as_const(*m_map)), m_now) << m_name; }
+  void CheckCommitted(Snapshot& snapshot) const {
+    if (!snapshot.HasRoot(m_name)) {
+      EXPECT_TRUE(m_committed.empty());
+      return;
+    }
+    EXPECT_EQ(NumbersOf(snapshot.Root<Map>(m_name)), m_committed) << m_name;
+    EXPECT_EQ(FaultsOf(snapshot.Root<Map>(m_name)), "") << m_name;
+  }
+
+ private:
+  static constexpr std::uint64_t kKeys = 9000;
+
+  std::string m_name;
+  Map* m_map = nullptr;
+  std::map<std::uint64_t, std::uint64_t> m_committed, m_now;
+};
+
+using RandomStoreTest = StoreTest;
+INSTANTIATE_STORE_TEST(RandomStoreTest);
+
+TEST_P(RandomStoreTest, MapsStayWhatTheirModelsAre) {
+  std::mt19937_64 random(TestSeed(5));
+  ModelledRoot<InsertionsMap> insertions("i");
+  ModelledRoot<TombstonesMap> tombstones("t");
+  ModelledRoot<HistoriesMap> histories("h");
+  for (int round = 0; round < 240 && !HasFailure(); ++round) {
+    SCOPED_TRACE(round);
+    {
+      WriteTransaction transaction(space());
+      insertions.Begin(transaction);
+      tombstones.Begin(transaction);
+      histories.Begin(transaction);
+      for (std::uint64_t i = random() % 12; i > 0; --i) {
+        const std::uint64_t map = random() % 4;
+        if (map == 0) insertions.Change(random);
+        if (map == 1) histories.Change(random);
+        if (map >= 2) tombstones.Change(random);
+      }
+      if (random() % 4 == 0) tombstones.CheckOpen();
+      if (random() % 3 != 0) {
+        transaction.Commit();
+        insertions.Committed();
+        tombstones.Committed();
+        histories.Committed();
+      }
+    }
+    if (random() % 6 == 0) site.Reopen();
+    if (random() % 4 != 0) continue;
+    Snapshot snapshot(space());
+    insertions.CheckCommitted(snapshot);
+    tombstones.CheckCommitted(snapshot);
+    histories.CheckCommitted(snapshot);
+  }
+  Snapshot snapshot(space());
+  const VerifyReport report = VerifySpace(snapshot);
+  EXPECT_TRUE(report.findings.empty()) << report.findings.front().fault;
+}
+
+}  // namespace
+}  // namespace vemo::test
