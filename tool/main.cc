@@ -1,6 +1,9 @@
 #include <fmt/core.h>
 
 #include <CLI/CLI.hpp>
+#include <cerrno>
+#include <cstdio>
+#include <cstring>
 #include <exception>
 
 #include "history/source_error.h"
@@ -19,7 +22,12 @@ ExitCode Fail(ExitCode code, const std::exception& error) {
 
 ExitCode Run(const Command& command) {
   try {
-    return command();
+    const ExitCode code = command();
+    // What was printed can still fail on its last way.
+    if (std::fflush(stdout) != 0) {
+      throw vemo::StoreError(std::string("standard output cannot be written: ") + std::strerror(errno));
+    }
+    return code;
   } catch (const vemo::StoreError& error) {
     return Fail(vemo::tool::kStoreFault, error);
   } catch (const vemo::Error& error) {
