@@ -1,4 +1,4 @@
-#include <fmt/format.h>
+#include <fmt/core.h>
 
 #include <CLI/CLI.hpp>
 #include <algorithm>
@@ -9,7 +9,6 @@
 #include "history/source_error.h"
 #include "platform/error.h"
 #include "tool/commands.h"
-#include "tool/output.h"
 
 namespace vemo::tool {
 
@@ -58,7 +57,7 @@ std::string BlameText(const std::vector<BlameRun>& runs) {
 ExitCode RunBlame(const BlameArguments& arguments) {
   const auto space = CSpace::Open(arguments.store);
   Snapshot snapshot(*space);
-  WriteOutput(BlameText(BlameField(snapshot, FieldToBlame(snapshot, arguments))));
+  fmt::print("{}", BlameText(BlameField(snapshot, FieldToBlame(snapshot, arguments))));
   return kGood;
 }
 

@@ -1,4 +1,4 @@
-#include <fmt/format.h>
+#include <fmt/core.h>
 
 #include <CLI/CLI.hpp>
 #include <memory>
@@ -8,7 +8,6 @@
 #include "store/statistics.h"
 #include "tool/commands.h"
 #include "tool/numbers.h"
-#include "tool/output.h"
 #include "tool/progress_bar.h"
 
 namespace vemo::tool {
@@ -120,12 +119,12 @@ ExitCode RunStats(const StatsArguments& arguments) {
     statistics = CollectStatistics(snapshot, [&bar](std::uint64_t done) { bar.Update(done); });
   }
   if (arguments.json) {
-    WriteOutput(JsonText(space->Name(), statistics));
+    fmt::print("{}", JsonText(space->Name(), statistics));
     return kGood;
   }
   std::string text = SpaceText(space->Name(), statistics);
   for (const MapStatistics& map : statistics.maps) text += MapText(map);
-  WriteOutput(text);
+  fmt::print("{}", text);
   return kGood;
 }
 
