@@ -239,6 +239,34 @@ TEST_P(TransactionTest, RootsThatCannotBeReadAgainAfterAnAbortAreReadByTheNextTr
   EXPECT_EQ(FaultsOf(*map), "");
 }
 
+TEST_P(TransactionTest, CommitsOfAnotherProcessAreSeenByTheNextTransaction) {
+  // A second handle on the same engine stands for the other process.
+  EngineWatch otherWatch;
+  const std::shared_ptr<Engine> sameEngine(&site.engine(), [](Engine*) {});
+  const auto other = CSpace::OpenOn(WatchEngine(sameEngine, otherWatch));
+  std::map<std::uint64_t, std::uint64_t> expected;
+  for (std::uint64_t round = 1; round <= 10; ++round) {
+    for (CSpace* turn : {&space(), other.get()}) {
+      WriteTransaction transaction(*turn);
+      auto& map = transaction.Root<TombstonesMap>("t");
+      EXPECT_EQ(NumbersOf(std::as_const(map)), expected);
+      EXPECT_EQ(FaultsOf(map), "");
+      const std::uint64_t shift = round * 2 + (turn == other.get() ? 1 : 0);
+      for (std::uint64_t n = 1 + 90 * (round % 4); n <= 90 * (round % 4) + 150; ++n) {
+        map.Insert(Key(n), PayloadOf<TombstonesMap>(shift), true);
+        expected[n] = shift;
+      }
+      for (std::uint64_t n = shift; n < 60; ++n) {
+        map.Delete(Key(n));
+        expected.erase(n);
+      }
+      if (turn == other.get()) Fill(transaction.Root<InsertionsMap>("theirs"), round, round);
+      transaction.Commit();
+    }
+  }
+  EXPECT_EQ(Snapshot(space()).Root<InsertionsMap>("theirs").size(), 10);
+}
+
 TEST_P(TransactionTest, ManyCommitsOnOneHandleEqualThoseOnFreshHandles) {
   std::map<std::uint64_t, std::uint64_t> expected;
   for (std::uint64_t round = 1; round <= 40; ++round) {

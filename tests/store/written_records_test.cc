@@ -2,6 +2,7 @@
 #include <algorithm>
 
 #include "tests/store/store_fixture.h"
+#include "tests/support/failing_allocator.h"
 
 namespace vemo::test {
 namespace {
@@ -105,6 +106,20 @@ TEST_P(WrittenRecordsTest, NodesOfAMapOnTheStackThatNoRootReachesAreDropped) {
   transaction.Commit();
   EXPECT_EQ(Stored().records.size(), before);
   EXPECT_EQ(Written().size(), 2u);
+}
+
+TEST_P(WrittenRecordsTest, WhatIsDroppedAlsoLeavesMemory) {
+  const auto round = [&] {
+    WriteTransaction transaction(space());
+    TombstonesMap stack;
+    Fill(stack, 1, 1000);
+    transaction.Root<TombstonesMap>("t").Insert(Key(1), {}, true);
+    transaction.Commit();
+  };
+  round();
+  const std::int64_t live = LiveAllocations();
+  for (int i = 0; i < 5; ++i) round();
+  EXPECT_LT(LiveAllocations(), live + 20);  // a thousand payloads and twenty nodes each
 }
 
 TEST_P(WrittenRecordsTest, AssignmentWritesTheWholeNewTree) {
