@@ -26,7 +26,7 @@ struct ReplayArguments {
   std::string author = "recorded author";
   std::string repository;
   std::string revision = "HEAD";
-  std::uint64_t batch = 10'000;
+  std::int64_t batch = 10'000;
   bool resume = false;
   bool check = false;
 };
@@ -80,6 +80,7 @@ void PrintSkipped(const SkippedFiles& skipped) {
 }
 
 ExitCode RunReplay(const ReplayArguments& arguments) {
+  if (arguments.batch < 1) throw UsageError("--batch: a batch has at least 1 edit");
   const std::unique_ptr<EditSource> source = OpenSource(arguments);
   auto space = CSpace::Open(arguments.store, {.create = true});
   const auto start = std::chrono::steady_clock::now();
@@ -87,7 +88,7 @@ ExitCode RunReplay(const ReplayArguments& arguments) {
   {
     ProgressBar bar("replaying", source->CountEdits());
     ReplayOptions options;
-    options.batchEdits = arguments.batch;
+    options.batchEdits = static_cast<std::uint64_t>(arguments.batch);
     options.resume = arguments.resume;
     options.progress = [&bar](std::uint64_t done) { bar.Update(done); };
     report = Replay(*space, *source, options);
@@ -131,8 +132,6 @@ void AddReplayCommand(CLI::App& app, Command& chosen) {
   command->add_option("--rev", arguments->revision, "The commit up to which the repository is replayed")
       ->capture_default_str();
   command->add_option("--batch", arguments->batch, "Commit after this many edits")
-      ->check(CLI::Validator([](const std::string& text) { return text == "0" ? "a batch has at least 1 edit" : ""; },
-                             "POSITIVE"))
       ->capture_default_str();
   command->add_flag("--resume", arguments->resume, "Go on after the last edit that the space has recorded");
   command->add_flag("--check", arguments->check,
