@@ -16,6 +16,7 @@ std::string OneLine(std::string_view text);
 class SourceError : public Error {
  public:
   explicit SourceError(std::string_view message) : Error(OneLine(message)) {}
+  std::error_code code() const noexcept override { return make_error_code(ErrorCode::kBadInput); }
 };
 
 }  // namespace vemo

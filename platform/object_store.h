@@ -3,7 +3,9 @@
 // (vxPersistStore/pref.h) belong to the same contract; README.md beside this file tells it whole.
 #pragma once
 
-namespace vemo {
+// Objects are told apart by the addresses of their function tables. A program that hides its symbols must still share those
+// of a shared library, so the tables' types and the objects' classes are visible from their first declaration on.
+namespace [[gnu::visibility("default")]] vemo {
 
 template <class I>
 class ptr;

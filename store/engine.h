@@ -111,6 +111,9 @@ class Engine {
   virtual std::unique_ptr<WriterLock> LockWriter(std::chrono::milliseconds timeout) = 0;
 
   virtual EngineUsage Usage() = 0;
+
+  // The ids of other processes that have a snapshot open now, as far as the engine knows of them.
+  virtual std::vector<std::int64_t> ReadersElsewhere() { return {}; }
 };
 
 }  // namespace vemo

@@ -69,6 +69,12 @@ RecordEnvelope OpenRecord(ByteView bytes, OID oid) {
   return envelope;
 }
 
+std::uint64_t CommitOfRecord(ByteView bytes) noexcept {
+  if (bytes.size() < 2) return 0;
+  const std::size_t commitAt = 1 + VariableLengthBytes(bytes[1]);
+  return bytes.size() < commitAt + kCommitBytes ? 0 : ReadUint64At(bytes.data() + commitAt);
+}
+
 Bytes SealNamed(NamedTable table, std::string_view name, ByteView value) {
   Bytes out;
   out.reserve(1 + value.size() + kChecksumBytes);

@@ -32,6 +32,9 @@ void SealRecord(Bytes& out, std::size_t begin, OID oid);
 // Throws MalformedBytes when the bytes are not what was sealed for `oid`.
 RecordEnvelope OpenRecord(ByteView bytes, OID oid);
 
+// The commit that wrote a record, read without checking anything; 0 for bytes that are too short.
+std::uint64_t CommitOfRecord(ByteView bytes) noexcept;
+
 Bytes SealNamed(NamedTable table, std::string_view name, ByteView value);
 ByteView OpenNamed(NamedTable table, std::string_view name, ByteView bytes);
 

@@ -1,5 +1,9 @@
 #include "store/snapshot.h"
 
+#include <unistd.h>
+
+#include <utility>
+
 #include "platform/error.h"
 #include "store/envelope.h"
 
@@ -13,7 +17,7 @@ std::string_view OpenMeta(const std::string& spaceName, std::string_view name, B
   try {
     return AsText(OpenNamed(NamedTable::kMeta, name, sealed));
   } catch (const MalformedBytes& malformed) {
-    throw CorruptRecord(spaceName + ": meta value \"" + std::string(name) + "\": " + malformed.what(), OID());
+    throw CorruptRecord(spaceName + ": meta value \"" + std::string(name) + "\": " + malformed.what(), {spaceName, "", OID(), "", std::nullopt});
   }
 }
 
@@ -32,10 +36,35 @@ void ScanStoredMeta(const EngineSnapshot& state, const std::string& spaceName, s
   });
 }
 
-Snapshot::Snapshot(CSpace& space) : m_space(space), m_view(space, space.m_engine->Name(), View::Kind::kSnapshot) {
+Snapshot::Snapshot(CSpace& space, std::string owner)
+    : m_space(space),
+      m_owner(std::move(owner)),
+      m_opened(space.m_options.clock()),
+      m_view(space, space.m_engine->Name(), View::Kind::kSnapshot) {
+  Begin();
   m_view.Attach(space.m_engine->OpenSnapshot());
   const std::lock_guard lock(space.m_snapshotsMutex);
   space.m_snapshots.insert(this);
+}
+
+// Starts the snapshot's age.
+void Snapshot::Begin() {
+  const std::lock_guard lock(m_space.m_snapshotsMutex);
+  m_opened = m_space.m_options.clock();
+  if (!m_space.m_options.readerMaxAge) return;
+  m_view.SetExpiry([&clock = m_space.m_options.clock, end = m_opened + *m_space.m_options.readerMaxAge] {
+    return clock() > end;
+  });
+}
+
+void Snapshot::Refresh() {
+  auto state = m_space.m_engine->OpenSnapshot();
+  Begin();
+  m_view.MoveTo(std::move(state));
+}
+
+ReaderInfo Snapshot::Describe(std::chrono::steady_clock::time_point now) const {
+  return {m_owner, getpid(), m_view.Generation(), std::chrono::duration_cast<std::chrono::milliseconds>(now - m_opened)};
 }
 
 Snapshot::~Snapshot() {

@@ -1,6 +1,7 @@
 // Reading a space as it was after one commit.
 #pragma once
 
+#include <chrono>
 #include <functional>
 #include <optional>
 #include <string>
@@ -16,7 +17,8 @@ namespace vemo {
 // from it end with it. Loaded nodes are its own and stay in memory until then.
 class Snapshot {
  public:
-  explicit Snapshot(CSpace& space);
+  // `owner` names the snapshot in CSpace::Readers().
+  explicit Snapshot(CSpace& space, std::string owner = "snapshot");
   ~Snapshot();
   Snapshot(const Snapshot&) = delete;
   Snapshot& operator=(const Snapshot&) = delete;
@@ -39,6 +41,13 @@ class Snapshot {
   void ScanMeta(std::string_view prefix,
                 const std::function<bool(std::string_view name, std::string_view value)>& visit) const;
 
+  // Moves to the newest commit. Root maps keep their address; nodes that did not change stay in memory, iterators and payload
+  // pointers end. Costs a look at the record of each node in memory.
+  void Refresh();
+
+  // Who reads, since when, and what.
+  ReaderInfo Describe(std::chrono::steady_clock::time_point now) const;
+
   // The number of commits that the space has had.
   std::uint64_t Generation() const noexcept { return m_view.Generation(); }
   View& Objects() noexcept { return m_view; }
@@ -52,7 +61,11 @@ class Snapshot {
  private:
   [[noreturn]] void RefuseRoot(std::string_view name, const IPersistable::FnTable* table);
 
+  void Begin();
+
   CSpace& m_space;
+  std::string m_owner;
+  std::chrono::steady_clock::time_point m_opened;
   View m_view;
 };
 

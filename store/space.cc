@@ -20,6 +20,10 @@ constexpr std::string_view kFormatName = "format";
 constexpr std::uint32_t kSpaceFormat = 1;
 constexpr std::uint64_t kMaxIdRange = 65'536;
 
+std::string AgeText(const std::optional<std::chrono::milliseconds>& age) {
+  return age ? std::to_string(age->count()) : "none";
+}
+
 std::unique_ptr<Engine> OpenEngine(const SpaceUri& uri, bool create) {
   if (uri.engine == SpaceUri::Engine::kMemory) return OpenMemoryEngine();
   LmdbOptions options;
@@ -63,7 +67,9 @@ CSpace::~CSpace() {
 
 std::string CSpace::OptionsText() const {
   return m_name + " create=" + (m_options.create ? "yes" : "no") +
-         " writer_timeout_ms=" + std::to_string(m_options.writerTimeout.count());
+         " writer_timeout_ms=" + std::to_string(m_options.writerTimeout.count()) +
+         " reader_warning_age_ms=" + AgeText(m_options.readerWarningAge) +
+         " reader_max_age_ms=" + AgeText(m_options.readerMaxAge);
 }
 
 // A new space gets its format number in its first commit; an older program must not touch a newer space.
@@ -76,7 +82,8 @@ void CSpace::CheckFormat(bool create) {
       BoundedReader reader(OpenNamed(NamedTable::kInfo, kFormatName, *stored));
       format = reader.ReadUint32();
     } catch (const MalformedBytes& malformed) {
-      throw CorruptRecord(m_engine->Name() + ": its format number is damaged: " + malformed.what(), OID());
+      throw CorruptRecord(m_engine->Name() + ": its format number is damaged: " + malformed.what(),
+                          m_writerView.Place(OID()));
     }
     if (format > kSpaceFormat) {
       throw IncompatibleSpace(m_engine->Name() + ": written in format " + std::to_string(format) +
@@ -93,6 +100,34 @@ void CSpace::CheckFormat(bool create) {
       {NamedTable::kInfo, std::string(kFormatName), SealNamed(NamedTable::kInfo, kFormatName, value)});
   const auto lock = m_engine->LockWriter(m_options.writerTimeout);
   if (m_engine->OpenSnapshot()->Generation() == 0) m_engine->Commit(batch);
+}
+
+void CSpace::Log(LogLevel level, const std::string& message) const {
+  if (m_options.log) m_options.log(level, m_engine->Name() + ": " + message);
+}
+
+std::vector<ReaderInfo> CSpace::Readers() {
+  std::vector<ReaderInfo> readers;
+  {
+    const auto now = m_options.clock();
+    const std::lock_guard lock(m_snapshotsMutex);
+    for (const Snapshot* snapshot : m_snapshots) readers.push_back(snapshot->Describe(now));
+  }
+  std::sort(readers.begin(), readers.end(), [](const auto& a, const auto& b) { return a.age > b.age; });
+  for (const std::int64_t process : m_engine->ReadersElsewhere()) {
+    readers.push_back({"process " + std::to_string(process), process, std::nullopt, std::nullopt});
+  }
+  return readers;
+}
+
+void CSpace::WarnOfOldReaders() {
+  if (!m_options.readerWarningAge || !m_options.log) return;
+  for (const ReaderInfo& reader : Readers()) {
+    if (!reader.age || *reader.age <= *m_options.readerWarningAge) continue;
+    Log(LogLevel::kWarning, "snapshot \"" + reader.owner + "\" of commit " + std::to_string(*reader.generation) +
+                                " has been open for " + std::to_string(reader.age->count()) +
+                                " ms; the space cannot use the room of later changes again until it ends or is refreshed");
+  }
 }
 
 OID CSpace::NextId() {

@@ -2,11 +2,15 @@
 #pragma once
 
 #include <chrono>
+#include <cstdint>
+#include <functional>
 #include <memory>
 #include <mutex>
+#include <optional>
 #include <set>
 #include <string>
 #include <string_view>
+#include <vector>
 
 #include "store/engine.h"
 #include "store/view.h"
@@ -16,9 +20,28 @@ namespace vemo {
 class Snapshot;
 class WriteTransaction;
 
+enum class LogLevel { kInfo, kWarning };
+
 struct SpaceOptions {
   bool create = false;  // make the space if it is not there
-  std::chrono::milliseconds writerTimeout{10'000};  // how long a transaction waits for the writer lock
+  // How long a transaction waits for the writer lock; 0 refuses at once with SpaceBusy.
+  std::chrono::milliseconds writerTimeout{10'000};
+  // Snapshots keep the pages of their commit from being used again. One that is older than this at a commit is logged.
+  std::optional<std::chrono::milliseconds> readerWarningAge = std::nullopt;
+  // One that is older than this lets go of its commit when it next reads from the engine, and throws SnapshotExpired.
+  std::optional<std::chrono::milliseconds> readerMaxAge = std::nullopt;
+  // Told of what is worth knowing but no error. Called on the thread that found it; must not call the space.
+  std::function<void(LogLevel level, const std::string& message)> log = nullptr;
+  // What ages are measured by.
+  std::function<std::chrono::steady_clock::time_point()> clock = &std::chrono::steady_clock::now;
+};
+
+// A snapshot of this process, or another process that reads the space.
+struct ReaderInfo {
+  std::string owner;                              // the name given to the snapshot, or "process 1234"
+  std::int64_t process = 0;
+  std::optional<std::uint64_t> generation;        // the commit that it sees; unknown of other processes
+  std::optional<std::chrono::milliseconds> age;   // unknown of other processes
 };
 
 // Opened once per process; transactions and snapshots are opened on it and must have ended before it is destroyed.
@@ -40,6 +63,8 @@ class CSpace {
   // The options in force, as text for people.
   std::string OptionsText() const;
   EngineUsage Usage() { return m_engine->Usage(); }
+  // All open snapshots of this process, oldest first, then other processes that read the space now.
+  std::vector<ReaderInfo> Readers();
 
  private:
   friend class Snapshot;
@@ -48,6 +73,8 @@ class CSpace {
   CSpace(std::string name, std::unique_ptr<Engine> engine, const SpaceOptions& options);
   void CheckFormat(bool create);
   OID NextId();
+  void Log(LogLevel level, const std::string& message) const;
+  void WarnOfOldReaders();
 
   // Ends what the mark of an object outside a transaction, or of a snapshot, has left half-changed, and throws.
   [[noreturn]] void RefuseMark(ptr<const IPersistable> object);

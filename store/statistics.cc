@@ -171,7 +171,8 @@ class Collector {
 
   template <class Exception>
   [[noreturn]] void Refuse(OID oid, const char* reason) {
-    throw Exception(m_snapshot.Objects().Describe(oid, "", std::string(reason) + " (run vemo verify)"), oid);
+    throw Exception(m_snapshot.Objects().Describe(oid, "", std::string(reason) + " (run vemo verify)"),
+                    m_snapshot.Objects().Place(oid));
   }
 
   // What hangs below the queue. A record that cannot be read is deleted all the same, but nothing below it.

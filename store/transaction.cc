@@ -1,6 +1,7 @@
 #include "store/transaction.h"
 
 #include <algorithm>
+#include <set>
 #include <utility>
 
 #include "platform/error.h"
@@ -24,6 +25,11 @@ void CheckName(std::string_view what, std::string_view name) {
     throw UsageError("the name of a " + std::string(what) + " has 1 to " + std::to_string(kMaxNameBytes) + " bytes, not " +
                      std::to_string(name.size()));
   }
+}
+
+void CheckRootName(std::string_view name) {
+  CheckName("root map", name);
+  if (name.front() == '\0') throw UsageError("the name of a root map cannot start with a zero byte");
 }
 
 const ClassEntry& MapClass(const IPersistable::FnTable* table) {
@@ -65,6 +71,9 @@ WriteTransaction::~WriteTransaction() {
   if (HasChanges()) {
     view.ForgetResidents();
     try {
+      for (auto renamed = m_renamedRoots.rbegin(); renamed != m_renamedRoots.rend(); ++renamed) {
+        view.RenameRoot(renamed->to, renamed->from);
+      }
       view.ReloadRoots();
     } catch (const std::exception&) {
       // The roots stay stale, and the next transaction reads them or throws.
@@ -98,12 +107,18 @@ void WriteTransaction::RequireOpen() const {
 
 // --- Roots ---
 
+// The root of that name as the transaction has left it, which the engine's state does not know yet.
+vemo::View::Root* WriteTransaction::FindAnyRoot(std::string_view name) const {
+  RequireOpen();
+  auto& roots = m_space.m_writerView.Roots();
+  const auto found = roots.find(name);
+  if (found != roots.end() && !found->second.oid.IsNull()) return &found->second;
+  return IsRemoved(name) ? nullptr : m_space.m_writerView.FindRoot(name);
+}
+
 vemo::View::Root* WriteTransaction::FindRootOfClass(std::string_view name, const ClassEntry& classEntry) {
   RequireOpen();
-  for (const RemovedRoot& removed : m_removedRoots) {
-    if (removed.name == name) return nullptr;  // the engine's state still has it
-  }
-  vemo::View::Root* root = m_space.m_writerView.FindRoot(name);
+  vemo::View::Root* root = FindAnyRoot(name);
   if (root != nullptr && root->classEntry != &classEntry) {
     throw UsageError(m_space.Name() + ": root \"" + std::string(name) + "\" is a " +
                      std::string(root->classEntry->Name()) + ", not a " + std::string(classEntry.Name()));
@@ -118,8 +133,7 @@ void* WriteTransaction::FindExistingRoot(std::string_view name, const IPersistab
 }
 
 void* WriteTransaction::FindOrMakeRoot(std::string_view name, const IPersistable::FnTable* table) {
-  CheckName("root map", name);
-  if (name.front() == '\0') throw UsageError("the name of a root map cannot start with a zero byte");
+  CheckRootName(name);
   const ClassEntry& classEntry = MapClass(table);
   if (const vemo::View::Root* root = FindRootOfClass(name, classEntry)) return root->map.m_self;
   return MakeRoot(name, classEntry);
@@ -149,20 +163,62 @@ OID WriteTransaction::RequireOwnedRoot(ptr<const IPersistable> map) {
   return oid;
 }
 
-void WriteTransaction::RemoveOwnedRoot(OID oid) {
-  vemo::View::Root* root = m_space.m_writerView.FindRoot(OwnedRootName(oid));
-  m_removedRoots.push_back({OwnedRootName(oid), oid, root->committed});
-  m_dirty.erase(oid);
-  SysStateOf(root->map).ClearFlag(ObjSysState::kDirtyFlag);
-  PersistStateOf(root->map).m_oid = OID();
-  root->oid = OID();
+std::vector<std::string> WriteTransaction::RootNames() const {
+  RequireOpen();
+  std::set<std::string> names;
+  m_space.m_writerView.State().ScanNamed(NamedTable::kRoots, "", [&](std::string_view name, ByteView) {
+    if (name.front() != '\0' && !IsRemoved(name)) names.emplace(name);
+    return true;
+  });
+  for (const auto& [name, root] : m_space.m_writerView.Roots()) {
+    if (!root.oid.IsNull() && name.front() != '\0') names.insert(name);
+  }
+  return {names.begin(), names.end()};
+}
+
+bool WriteTransaction::IsRemoved(std::string_view name) const {
+  return std::any_of(m_removedRoots.begin(), m_removedRoots.end(), [name](const auto& root) { return root.name == name; });
+}
+
+void WriteTransaction::RenameRoot(std::string_view from, std::string_view to) {
+  CheckRootName(to);
+  vemo::View::Root* root = FindAnyRoot(from);
+  if (root == nullptr) throw UsageError(m_space.Name() + ": it has no root map \"" + std::string(from) + "\"");
+  if (FindAnyRoot(to) != nullptr) throw UsageError(m_space.Name() + ": it has a root map \"" + std::string(to) + "\" already");
+  m_removedRoots.push_back({std::string(from), OID()});
+  m_renamedRoots.push_back({std::string(from), std::string(to)});
+  m_space.m_writerView.RenameRoot(from, to).committed = false;
+}
+
+void WriteTransaction::DeleteRoot(std::string_view name) {
+  CheckRootName(name);
+  if (FindAnyRoot(name) == nullptr) throw UsageError(m_space.Name() + ": it has no root map \"" + std::string(name) + "\"");
+  DeleteRootObject(std::string(name));
+}
+
+void WriteTransaction::DeleteRootObject(const std::string& name) {
+  vemo::View::Root& root = *FindAnyRoot(name);
+  try {
+    for (const prefbase& child : OwnedReferences(root.map)) DeleteSubTree(child.Get());
+    m_removedRoots.push_back({name, root.oid});
+  } catch (...) {
+    m_poisoned = true;
+    throw;
+  }
+  m_dirty.erase(root.oid);
+  root.oid = OID();
+  root.committed = false;
+  m_space.m_writerView.ResetInPlace(root);
 }
 
 void WriteTransaction::AddRemovedRoots(CommitBatch& batch) const {
-  for (const RemovedRoot& root : m_removedRoots) {
-    if (!root.committed) continue;
-    batch.namedValues.push_back({NamedTable::kRoots, root.name, std::nullopt});
-    batch.removedRecords.push_back(root.oid);
+  const auto& roots = m_space.m_writerView.Roots();
+  for (const RemovedRoot& removed : m_removedRoots) {
+    const auto again = roots.find(removed.name);  // another root may have got the name since
+    if (again == roots.end() || again->second.oid.IsNull()) {
+      batch.namedValues.push_back({NamedTable::kRoots, removed.name, std::nullopt});
+    }
+    if (!removed.oid.IsNull()) batch.removedRecords.push_back(removed.oid);
   }
 }
 
@@ -336,15 +392,7 @@ void WriteTransaction::Commit() {
   CommitBuilder builder(view, m_space, m_new, m_deletedIds);
   CommitBatch& batch = builder.Batch();
   try {
-    for (auto& [name, root] : view.Roots()) {
-      if (root.committed || root.oid.IsNull()) continue;
-      builder.Add(root.oid, root.map);
-      batch.namedValues.push_back(
-          {NamedTable::kRoots, name, EncodeRootValue(name, {std::string(root.classEntry->Name()), root.oid})});
-    }
-    for (const auto& [oid, object] : m_dirty) {
-      if (!m_new.contains(oid)) builder.Add(oid, object);
-    }
+    AddChanged(builder);
     builder.SweepQueue(kDeletionsPerCommit);
     for (const Deleted& deleted : m_deleted) {
       if (deleted.hasRecord) batch.removedRecords.push_back(deleted.oid);
@@ -372,6 +420,40 @@ void WriteTransaction::Commit() {
     Reattach();
     throw;
   }
+  m_space.WarnOfOldReaders();
+}
+
+// Every dirty object that has a record, every root without one, and what is new below them.
+void WriteTransaction::AddChanged(CommitBuilder& builder) const {
+  for (auto& [name, root] : m_space.m_writerView.Roots()) {
+    if (root.committed || root.oid.IsNull()) continue;
+    builder.Add(root.oid, root.map);
+    builder.Batch().namedValues.push_back(
+        {NamedTable::kRoots, name, EncodeRootValue(name, {std::string(root.classEntry->Name()), root.oid})});
+  }
+  for (const auto& [oid, object] : m_dirty) {
+    if (!m_new.contains(oid)) builder.Add(oid, object);
+  }
+}
+
+WriteTransaction::DirtySize WriteTransaction::Dirty() const {
+  RequireOpen();
+  vemo::View& view = m_space.m_writerView;
+  const std::size_t classesBefore = view.NumClassNumbers();
+  DirtySize dirty;
+  try {
+    CommitBuilder builder(view, m_space, m_new, m_deletedIds);
+    AddChanged(builder);
+    for (const CommitBatch::Record& record : builder.Finish().records) {
+      ++dirty.objects;
+      dirty.bytes += record.bytes.size();
+    }
+  } catch (...) {
+    view.TruncateClassNumbers(classesBefore);
+    throw;
+  }
+  view.TruncateClassNumbers(classesBefore);
+  return dirty;
 }
 
 // After a commit that failed: the transaction goes on where it was, unless the engine has moved under it.

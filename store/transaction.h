@@ -17,6 +17,8 @@
 
 namespace vemo {
 
+class CommitBuilder;
+
 // Holds the writer lock of its space, in this process and across processes, from the constructor until Commit or the
 // destructor, which aborts. Used by the thread that opened it; a thread has at most one open.
 //
@@ -46,6 +48,14 @@ class WriteTransaction {
     return *static_cast<const Map*>(FindExistingRoot(name, IPersistable::Stubs<Map>::GetTable()));
   }
 
+  // Named roots, those of this transaction included, in order.
+  std::vector<std::string> RootNames() const;
+  // The map keeps its address, and every reference to it stays good. Throws UsageError when there is no root `from`, or one
+  // of the name `to`.
+  void RenameRoot(std::string_view from, std::string_view to);
+  // Deletes the map with all it holds, as clear() does, and its name. Throws UsageError when there is none.
+  void DeleteRoot(std::string_view name);
+
   // A root map without a name, known by its id: for maps that live longer than a transaction and are not to be found by
   // name. Disown deletes it with all it holds.
   template <class Map>
@@ -58,9 +68,7 @@ class WriteTransaction {
   }
   template <class Map>
   void Disown(Map& map) {
-    const OID oid = RequireOwnedRoot(ptr<const IPersistable>(&map));
-    map.clear();
-    RemoveOwnedRoot(oid);
+    DeleteRootObject(OwnedRootName(RequireOwnedRoot(ptr<const IPersistable>(&map))));
   }
 
   // Small named values of the user's own, committed with everything else. Names have 1 to 400 bytes.
@@ -76,6 +84,14 @@ class WriteTransaction {
   // when the engine fails; the transaction then stays open, to be tried again or aborted. Costs a record per changed
   // object.
   void Commit();
+
+  // The objects that a commit would write now, and the size of their records as they would be: for a look before committing.
+  // Costs encoding them.
+  struct DirtySize {
+    std::uint64_t objects = 0;
+    std::uint64_t bytes = 0;
+  };
+  DirtySize Dirty() const;
 
   bool IsPoisoned() const noexcept { return m_poisoned; }
 
@@ -95,10 +111,14 @@ class WriteTransaction {
     ptr<IPersistable> object;
     bool hasRecord;
   };
+  // A name that is to go, and the record of its map where that goes too.
   struct RemovedRoot {
     std::string name;
     OID oid;
-    bool committed;
+  };
+  struct RenamedRoot {
+    std::string from;
+    std::string to;
   };
 
   static std::string OwnedRootName(OID oid);
@@ -106,7 +126,7 @@ class WriteTransaction {
   void* FindExistingRoot(std::string_view name, const IPersistable::FnTable* table);
   void* MakeOwnedRoot(const IPersistable::FnTable* table);
   OID RequireOwnedRoot(ptr<const IPersistable> map);
-  void RemoveOwnedRoot(OID oid);
+  void DeleteRootObject(const std::string& name);
   vemo::View::Root* FindRootOfClass(std::string_view name, const ClassEntry& classEntry);
   void* MakeRoot(std::string_view name, const ClassEntry& classEntry);
 
@@ -115,6 +135,9 @@ class WriteTransaction {
   bool HasDirtyNodes() const noexcept;
 
   bool HasChanges() const noexcept;
+  vemo::View::Root* FindAnyRoot(std::string_view name) const;
+  bool IsRemoved(std::string_view name) const;
+  void AddChanged(CommitBuilder& builder) const;
   void AddRemovedRoots(CommitBatch& batch) const;
   void Reattach() noexcept;
   void AfterCommit(std::uint64_t generation, const std::unordered_set<OID>& written) noexcept;
@@ -134,6 +157,7 @@ class WriteTransaction {
   std::unordered_set<OID> m_deletedIds;
   std::vector<OID> m_queuedDeletions;                  // subtrees of which nothing is in memory
   std::vector<RemovedRoot> m_removedRoots;
+  std::vector<RenamedRoot> m_renamedRoots;
   std::map<std::string, std::optional<std::string>, std::less<>> m_meta;  // nothing: erased
 };
 

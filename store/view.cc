@@ -2,6 +2,7 @@
 
 #include <algorithm>
 #include <charconv>
+#include <unordered_set>
 #include <utility>
 
 #include "platform/error.h"
@@ -23,6 +24,22 @@ class ReadingScope {
 
  private:
   View* m_outer;
+};
+
+// Takes references to some objects back to the unbound state.
+class UnbindVisitor : public IObjectVisitor {
+ public:
+  UnbindVisitor(const std::unordered_set<OID>& gone, const View* view) : m_gone(gone), m_view(view) {}
+  void VisitObject(ptr<const IObject>) override {}
+  void VisitEvictableObject(const prefbase& reference) override {
+    if (!m_gone.contains(reference.m_oid)) return;
+    reference.m_ptr.m_self = nullptr;
+    reference.m_ptr.m_table = m_view;
+  }
+
+ private:
+  const std::unordered_set<OID>& m_gone;
+  const View* m_view;
 };
 
 constexpr std::string_view kClassPrefix = "class/";
@@ -95,10 +112,44 @@ void View::Attach(std::unique_ptr<EngineSnapshot> state) {
 }
 
 const EngineSnapshot& View::State() const {
+  if (m_expiry && m_expiry()) {
+    m_state.reset();  // its pages can be used again
+    throw SnapshotExpired(m_spaceName + ": the snapshot has been open for longer than the space allows; refresh it or take another",
+                          Place(OID()));
+  }
   if (m_state == nullptr) {
     throw UsageError(m_spaceName + ": a map of the writer was read outside a transaction; open one, or take a Snapshot");
   }
   return *m_state;
+}
+
+// What did not change keeps its place in memory: a record that the same commit wrote has the same bytes. References to what
+// did change are unbound.
+void View::MoveTo(std::unique_ptr<EngineSnapshot> state) {
+  if (state->Generation() == m_generation && !m_rootsAreStale) {
+    m_state = std::move(state);
+    return;
+  }
+  std::vector<OID> changed;
+  for (const auto& [oid, resident] : m_residents) {
+    const std::optional<ByteView> record = state->Read(oid);
+    if (!record || CommitOfRecord(*record) != resident.commit) changed.push_back(oid);
+  }
+  std::unordered_set<OID> gone(changed.begin(), changed.end());
+  m_state = std::move(state);
+  m_generation = m_state->Generation();
+  for (const OID oid : changed) {
+    DestroyObject(Find(oid));
+    Release(oid);
+  }
+  UnbindVisitor unbind(gone, this);
+  for (const auto& [oid, resident] : m_residents) {
+    resident.object.Table()->_IObject.VisitObjects(resident.object.m_self, unbind);
+  }
+  for (auto& [name, root] : m_roots) ResetInPlace(root);
+  m_rootsAreStale = true;
+  ReadClassNumbers();
+  ReloadRoots();
 }
 
 std::string View::Describe(OID oid, std::string_view className, std::string_view reason) const {
@@ -107,11 +158,15 @@ std::string View::Describe(OID oid, std::string_view className, std::string_view
   return text += ": " + std::string(reason);
 }
 
+ErrorPlace View::Place(OID oid, std::string_view className, std::string_view root) const {
+  return {m_spaceName, std::string(root), oid, std::string(className), std::nullopt};
+}
+
 // --- Objects ---
 
 ptr<IPersistable> View::Find(OID oid) const noexcept {
   const auto found = m_residents.find(oid);
-  return found == m_residents.end() ? ptr<IPersistable>() : found->second;
+  return found == m_residents.end() ? ptr<IPersistable>() : found->second.object;
 }
 
 void View::Own(ptr<IPersistable> object, OID oid) noexcept {
@@ -127,10 +182,10 @@ bool View::Holds(OID oid, const void* self) const {
   return Find(oid).m_self == self || std::any_of(m_roots.begin(), m_roots.end(), isRoot);
 }
 
-void View::Adopt(OID oid, ptr<IPersistable> object) {
+void View::Adopt(OID oid, ptr<IPersistable> object, std::uint64_t commit) {
   {
     const std::lock_guard lock(m_tablesMutex);
-    m_residents.emplace(oid, object);
+    m_residents.emplace(oid, Resident{object, commit});
   }
   Own(object, oid);
 }
@@ -145,11 +200,12 @@ ptr<IPersistable> View::Resolve(OID oid, const IPersistable::FnTable* expected) 
   if (object.m_self == nullptr) {
     const std::optional<ByteView> record = State().Read(oid);
     if (!record) {
-      throw DanglingReference(Describe(oid, "", "it is referred to, but there is no record of it (run vemo verify)"), oid);
+      throw DanglingReference(Describe(oid, "", "it is referred to, but there is no record of it (run vemo verify)"),
+                              Place(oid));
     }
     object = Decode(oid, *record);
     try {
-      Adopt(oid, object);
+      Adopt(oid, object, CommitOfRecord(*record));
     } catch (...) {
       DestroyObject(object);
       throw;
@@ -160,7 +216,7 @@ ptr<IPersistable> View::Resolve(OID oid, const IPersistable::FnTable* expected) 
     throw CorruptRecord(Describe(oid, FindClass(object.Table())->Name(),
                                  "a " + std::string(wanted != nullptr ? wanted->Name() : "different class") +
                                      " should stand here (run vemo verify)"),
-                        oid);
+                        Place(oid, FindClass(object.Table())->Name()));
   }
   return object;
 }
@@ -182,7 +238,9 @@ ptr<IPersistable> View::Decode(OID oid, ByteView record) {
     return object;
   } catch (const MalformedBytes& malformed) {
     if (object.m_self != nullptr) DestroyObject(object);
-    throw CorruptRecord(Describe(oid, className, malformed.what()), oid);
+    ErrorPlace place = Place(oid, className);
+    place.offset = malformed.offset();
+    throw CorruptRecord(Describe(oid, className, malformed.what()), std::move(place));
   } catch (...) {
     if (object.m_self != nullptr) DestroyObject(object);
     throw;
@@ -200,7 +258,8 @@ void View::ReadClassNumbers() {
       if (classes.size() < number) classes.resize(number);
       classes[number - 1] = FindClass(std::string_view(reinterpret_cast<const char*>(value.data()), value.size()));
     } catch (const MalformedBytes& malformed) {
-      throw CorruptRecord(m_spaceName + ": class table, \"" + std::string(name) + "\": " + malformed.what(), OID());
+      throw CorruptRecord(m_spaceName + ": class table, \"" + std::string(name) + "\": " + malformed.what(),
+                          Place(OID()));
     }
     return true;
   });
@@ -209,7 +268,8 @@ void View::ReadClassNumbers() {
 
 const ClassEntry& View::ClassOf(OID oid, std::uint32_t number) const {
   if (number == 0 || number > m_classes.size() || m_classes[number - 1] == nullptr) {
-    throw CorruptRecord(Describe(oid, "", "its class number " + std::to_string(number) + " names no class known here"), oid);
+    throw CorruptRecord(Describe(oid, "", "its class number " + std::to_string(number) + " names no class known here"),
+                        Place(oid));
   }
   return *m_classes[number - 1];
 }
@@ -243,7 +303,8 @@ View::Root* View::FindRoot(std::string_view name) {
   try {
     value = DecodeRootValue(name, *sealed);
   } catch (const MalformedBytes& malformed) {
-    throw CorruptRecord(m_spaceName + ": root \"" + std::string(name) + "\": " + malformed.what(), OID());
+    throw CorruptRecord(m_spaceName + ": root \"" + std::string(name) + "\": " + malformed.what(),
+                        Place(OID(), "", name));
   }
   const ClassEntry* classEntry = FindClass(value.className);
   if (classEntry == nullptr || !classEntry->isMap) {
@@ -283,13 +344,24 @@ View::Root& View::AddRoot(std::string_view name, const ClassEntry& classEntry, O
   return found->second;
 }
 
+View::Root& View::RenameRoot(std::string_view from, std::string_view to) {
+  const std::lock_guard lock(m_tablesMutex);
+  if (const auto absent = m_roots.find(to); absent != m_roots.end()) {
+    m_retiredRoots.push_back(absent->second);
+    m_roots.erase(absent);
+  }
+  auto node = m_roots.extract(m_roots.find(from));
+  node.key() = std::string(to);
+  return m_roots.insert(std::move(node)).position->second;
+}
+
 // Reads the record of a root into its map, which is in the default state.
 void View::ReadRoot(std::string_view name, Root& root) {
   const std::optional<ByteView> record = State().Read(root.oid);
   if (!record) {
     throw DanglingReference(Describe(root.oid, root.classEntry->Name(),
                                      "root \"" + std::string(name) + "\" has no record (run vemo verify)"),
-                            root.oid);
+                            Place(root.oid, root.classEntry->Name(), name));
   }
   const ptr<IPersistable> read = Decode(root.oid, *record);
   const bool isOfClass = read.Table() == root.map.Table();
@@ -303,7 +375,7 @@ void View::ReadRoot(std::string_view name, Root& root) {
   if (!isOfClass) {
     throw CorruptRecord(Describe(root.oid, FindClass(read.Table())->Name(),
                                  "root \"" + std::string(name) + "\" should be a " + std::string(root.classEntry->Name())),
-                        root.oid);
+                        Place(root.oid, FindClass(read.Table())->Name(), name));
   }
   root.committed = true;
 }
@@ -317,12 +389,12 @@ void View::ResetInPlace(Root& root) noexcept {
 }
 
 void View::ForgetResidents() noexcept {
-  std::unordered_map<OID, ptr<IPersistable>> forgotten;
+  std::unordered_map<OID, Resident> forgotten;
   {
     const std::lock_guard lock(m_tablesMutex);
     forgotten.swap(m_residents);
   }
-  for (const auto& [oid, object] : forgotten) DestroyObject(object);
+  for (const auto& [oid, resident] : forgotten) DestroyObject(resident.object);
   for (auto& [name, root] : m_roots) {
     if (!root.committed) root.oid = OID();
     ResetInPlace(root);

@@ -18,6 +18,7 @@
 #pragma once
 
 #include <cstdint>
+#include <functional>
 #include <map>
 #include <memory>
 #include <mutex>
@@ -68,6 +69,11 @@ class View {
 
   // Shows the commit of `state` from now on. Objects of another commit are forgotten and root maps read anew in place.
   void Attach(std::unique_ptr<EngineSnapshot> state);
+  // Shows the commit of `state` from now on and keeps the objects that it has unchanged. For views that nobody writes in.
+  // Costs a look at the record of each object in memory.
+  void MoveTo(std::unique_ptr<EngineSnapshot> state);
+  // From now on, a read for which `isExpired` is true lets go of the state and throws SnapshotExpired.
+  void SetExpiry(std::function<bool()> isExpired) { m_expiry = std::move(isExpired); }
   // Goes on with a state of the commit that the view shows already.
   void Resume(std::unique_ptr<EngineSnapshot> state) noexcept { m_state = std::move(state); }
   // Lets go of the engine's state; objects stay, loading is refused.
@@ -89,8 +95,8 @@ class View {
   ptr<IPersistable> Find(OID oid) const noexcept;
   // Whether the object of that id and address is a resident or a root map. Unlike the rest, for any thread.
   bool Holds(OID oid, const void* self) const;
-  // Takes a new object in.
-  void Adopt(OID oid, ptr<IPersistable> object);
+  // Takes an object in; `commit` is the one that wrote its record, 0 for a new one.
+  void Adopt(OID oid, ptr<IPersistable> object, std::uint64_t commit = 0);
   // Removes a resident without ending it.
   void Release(OID oid) noexcept;
 
@@ -98,6 +104,10 @@ class View {
   Root* FindRoot(std::string_view name);
   // Enters a root that the open transaction makes.
   Root& AddRoot(std::string_view name, const ClassEntry& classEntry, OID oid);
+  // Sets the map of a root to the default state, in place.
+  void ResetInPlace(Root& root) noexcept;
+  // Gives a root in memory another name, under which no root of the space stands.
+  Root& RenameRoot(std::string_view from, std::string_view to);
   std::map<std::string, Root, std::less<>>& Roots() noexcept { return m_roots; }
 
   // Ends all residents and sets root maps back to the default state, in place.
@@ -115,23 +125,29 @@ class View {
 
   // The message of an exception about object `oid`.
   std::string Describe(OID oid, std::string_view className, std::string_view reason) const;
+  ErrorPlace Place(OID oid, std::string_view className = "", std::string_view root = "") const;
 
  private:
   const ClassEntry& ClassOf(OID oid, std::uint32_t number) const;
   void ReadClassNumbers();
   void ReadRoot(std::string_view name, Root& root);
   void Own(ptr<IPersistable> object, OID oid) noexcept;
-  void ResetInPlace(Root& root) noexcept;
+
+  struct Resident {
+    ptr<IPersistable> object;
+    std::uint64_t commit;
+  };
 
   CSpace& m_space;
   std::string m_spaceName;
   Kind m_kind;
-  std::unique_ptr<EngineSnapshot> m_state;
+  mutable std::unique_ptr<EngineSnapshot> m_state;  // an expired state is let go of when it is asked for
+  std::function<bool()> m_expiry;
   std::uint64_t m_generation = 0;
   bool m_rootsAreStale = false;
   std::vector<const ClassEntry*> m_classes;  // number - 1 -> class; null where this program does not know it
   mutable std::mutex m_tablesMutex;  // held where the residents or the roots change, for Holds
-  std::unordered_map<OID, ptr<IPersistable>> m_residents;
+  std::unordered_map<OID, Resident> m_residents;
   std::map<std::string, Root, std::less<>> m_roots;
   std::vector<Root> m_retiredRoots;  // maps whose name now stands for another class
 };

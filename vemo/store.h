@@ -1,6 +1,7 @@
 // The three maps in spaces: open one, change it in a transaction, read it in a snapshot.
 #pragma once
 
+#include "store/scope.h"        // IWYU pragma: export
 #include "store/snapshot.h"     // IWYU pragma: export
 #include "store/transaction.h"  // IWYU pragma: export
 #include "vemo/maps.h"          // IWYU pragma: export

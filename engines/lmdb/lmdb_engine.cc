@@ -126,6 +126,8 @@ class LmdbEngine final : public Engine {
     return std::make_unique<LmdbWriterLock>(m_environment->path(), m_environment->name(), timeout);
   }
 
+  std::vector<std::int64_t> ReadersElsewhere() override { return m_environment->ReadersElsewhere(); }
+
   EngineUsage Usage() override {
     EngineUsage usage;
     usage.records = m_environment->CountRecords();

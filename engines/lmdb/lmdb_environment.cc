@@ -1,8 +1,11 @@
 #include "engines/lmdb/lmdb_environment.h"
 
 #include <lmdb.h>
+
 #include <sys/resource.h>
 #include <unistd.h>
+#include <set>
+#include <sstream>
 
 #include <algorithm>
 #include <bit>
@@ -166,7 +169,7 @@ void LmdbEnvironment::OpenFlexibly() {
       Open(bytes);
       return;
     } catch (const LmdbError& error) {
-      if (error.code() != ENOMEM || bytes / 2 < kSmallestMapBytes) throw;
+      if (error.lmdbCode() != ENOMEM || bytes / 2 < kSmallestMapBytes) throw;
     }
   }
 }
@@ -230,7 +233,7 @@ void LmdbEnvironment::Write(const char* operation, const std::function<void(MDB_
       return;
     } catch (const LmdbError& error) {
       const std::lock_guard state(m_state);
-      Recover(error.code(), operation);
+      Recover(error.lmdbCode(), operation);
     }
   }
 }
@@ -243,6 +246,31 @@ std::uint64_t LmdbEnvironment::CountRecords() {
   MDB_stat stat{};
   CheckLmdb(mdb_stat(txn.get(), m_tables.records, &stat), kOperation, m_name);
   return stat.ms_entries;
+}
+
+// LMDB prints its reader table as text: process id, thread, and the transaction or a dash.
+std::vector<std::int64_t> LmdbEnvironment::ReadersElsewhere() {
+  RequireOwnProcess("list readers");
+  std::string table;
+  {
+    const std::scoped_lock lock(m_state);
+    if (m_env == nullptr) return {};
+    const auto append = [](const char* line, void* text) {
+      *static_cast<std::string*>(text) += line;
+      return 0;
+    };
+    mdb_reader_list(m_env, append, &table);
+  }
+  std::set<std::int64_t> processes;
+  std::istringstream lines(table);
+  for (std::string line; std::getline(lines, line);) {
+    std::istringstream words(line);
+    std::int64_t process = 0;
+    std::string thread, transaction;
+    if (words >> process >> thread >> transaction && transaction != "-" && process != m_process)
+      processes.insert(process);
+  }
+  return {processes.begin(), processes.end()};
 }
 
 int LmdbEnvironment::TryBeginRead(MDB_txn** txn) {

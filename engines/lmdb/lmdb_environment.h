@@ -20,6 +20,7 @@
 #include <mutex>
 #include <optional>
 #include <string>
+#include <vector>
 
 #include "engines/lmdb/lmdb_engine.h"
 #include "engines/lmdb/lmdb_layout.h"
@@ -55,6 +56,9 @@ class LmdbEnvironment {
 
   // The number of records in the newest commit.
   std::uint64_t CountRecords();
+
+  // The ids of other processes that have a read transaction open.
+  std::vector<std::int64_t> ReadersElsewhere();
 
  private:
   bool IsOwnProcess() const noexcept;

@@ -11,7 +11,7 @@ namespace vemo {
 class LmdbError : public StoreError {
  public:
   LmdbError(const std::string& operation, const std::string& space, int code);
-  int code() const noexcept { return m_code; }  // of LMDB where negative, otherwise an errno
+  int lmdbCode() const noexcept { return m_code; }  // of LMDB where negative, otherwise an errno
 
  private:
   int m_code;
