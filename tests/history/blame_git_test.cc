@@ -206,6 +206,15 @@ TEST_F(GitBlame, DiffersOnARenamedFileOnlyWhereGitFollowsIt) {
   EXPECT_EQ(CountFollowedLines(), 7u);
 }
 
+TEST_F(GitBlame, NamesTheAuthorAsTheCommitHasItWhereGitMapsIt) {
+  m_repository.Write("f", "1\n");
+  m_repository.Write(".mailmap", "Ada King <king@example.org> <ada@example.org>\n");
+  const std::string commit = m_repository.Commit();
+  Replay();
+  EXPECT_EQ(GitLines("f"), (Strings{commit + " Ada King <king@example.org>"}));
+  EXPECT_EQ(OurLines("f"), (Strings{commit + " Ada Lovelace <ada@example.org>"}));
+}
+
 class RandomGitBlame : public GitBlame, public testing::WithParamInterface<std::uint64_t> {};
 
 TEST_P(RandomGitBlame, AgreesLineByLineOnAWholeHistory) {
