@@ -13,7 +13,8 @@
 #include "platform/types.h"
 #include "vxPersistStore/ptr.h"
 
-namespace vemo {
+// Visible for the sake of the function tables: see platform/object_store.h.
+namespace [[gnu::visibility("default")]] vemo {
 
 class Archive;
 class InputArchive;

@@ -12,7 +12,8 @@
 #include "vxOperation/src/WorkingSet/CompOp/FieldMapInstance.h"
 #include "vxOperation/src/WorkingSet/CompOp/FieldMapRecords.h"
 
-namespace vemo {
+// Visible for the sake of the function tables: see platform/object_store.h.
+namespace [[gnu::visibility("default")]] vemo {
 
 // Payloads own their buffers and list nodes, none of which points back at the payload.
 template <>
