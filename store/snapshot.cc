@@ -72,11 +72,6 @@ Snapshot::~Snapshot() {
   m_space.m_snapshots.erase(this);
 }
 
-std::size_t Snapshot::NumOpenOnSpace() const {
-  const std::lock_guard lock(m_space.m_snapshotsMutex);
-  return m_space.m_snapshots.size();
-}
-
 ptr<IPersistable> Snapshot::RootMap(std::string_view name) {
   const View::Root* root = m_view.FindRoot(name);
   if (root == nullptr) throw UsageError(m_space.Name() + ": it has no root map \"" + std::string(name) + "\"");

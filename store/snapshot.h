@@ -52,8 +52,6 @@ class Snapshot {
   std::uint64_t Generation() const noexcept { return m_view.Generation(); }
   View& Objects() noexcept { return m_view; }
   CSpace& Space() const noexcept { return m_space; }
-  // How many snapshots this process has open on the space, this one included. Thread-safe.
-  std::size_t NumOpenOnSpace() const;
 
   // Forgets the view's objects if the one of that id and address is among them, and returns whether it was.
   bool ForgetIfHolds(OID oid, const void* self) noexcept;

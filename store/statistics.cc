@@ -47,7 +47,7 @@ class Collector {
   SpaceStatistics Run() {
     m_statistics.commit = m_snapshot.Generation();
     m_statistics.mediumBytes = m_snapshot.Space().Usage().bytes;
-    m_statistics.openSnapshots = m_snapshot.NumOpenOnSpace();
+    m_statistics.readers = m_snapshot.Space().Readers();
     State().ScanNamed(NamedTable::kRoots, "", [this](std::string_view name, ByteView) {
       m_rootNames.emplace_back(name);
       return true;

@@ -65,11 +65,11 @@ struct SpaceStatistics {
   std::uint64_t mediumBytes = 0;    // taken on the medium now, with what older snapshots still see
   std::vector<MapStatistics> maps;  // owned maps first, then by name
   std::uint64_t queuedDeletions =
-      0;                          // entries of the queue: subtrees whose deletion goes on with later commits
-  Amount awaitingDeletion;        // the records of these and below them
-  Amount unreachable;             // reached neither from a root nor from the queue: to be collected
-  Amount meta;                    // the user's named values; bytes of names and values, without their seals
-  std::size_t openSnapshots = 0;  // of this process on this space, the one that was asked included
+      0;                    // entries of the queue: subtrees whose deletion goes on with later commits
+  Amount awaitingDeletion;  // the records of these and below them
+  Amount unreachable;       // reached neither from a root nor from the queue: to be collected
+  Amount meta;              // the user's named values; bytes of names and values, without their seals
+  std::vector<ReaderInfo> readers;  // as CSpace::Readers lists them, the snapshot that was asked included
 };
 
 // Reads every record once and keeps none of them in memory: the snapshot does not grow, beyond its root maps.

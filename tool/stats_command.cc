@@ -1,8 +1,10 @@
-#include <fmt/core.h>
+#include <fmt/format.h>
+#include <unistd.h>
 
 #include <CLI/CLI.hpp>
 #include <memory>
 #include <nlohmann/json.hpp>
+#include <vector>
 
 #include "history/source_error.h"
 #include "store/statistics.h"
@@ -20,6 +22,15 @@ struct StatsArguments {
   std::string store;
   bool json = false;
 };
+
+// The other processes that have a snapshot open.
+std::vector<std::int64_t> ReadersElsewhere(const SpaceStatistics& statistics) {
+  std::vector<std::int64_t> processes;
+  for (const ReaderInfo& reader : statistics.readers) {
+    if (reader.process != getpid()) processes.push_back(reader.process);
+  }
+  return processes;
+}
 
 // --- As JSON ---
 
@@ -62,8 +73,11 @@ std::string JsonText(const std::string& space, const SpaceStatistics& statistics
                {"awaiting_deletion", AmountJson(statistics.awaitingDeletion)},
                {"unreachable", AmountJson(statistics.unreachable)},
                {"meta", AmountJson(statistics.meta)},
+               {"reading_processes", Json::array()},
                {"maps", Json::array()}};
   json["awaiting_deletion"]["queued"] = statistics.queuedDeletions;
+  for (const std::int64_t process : ReadersElsewhere(statistics))
+    json["reading_processes"].push_back(process);
   for (const MapStatistics& map : statistics.maps) json["maps"].push_back(MapJson(map));
   // The names of roots and spaces may have any bytes; those that are not UTF-8 become U+FFFD.
   return json.dump(2, ' ', false, Json::error_handler_t::replace) + "\n";
@@ -85,6 +99,11 @@ std::string SpaceText(const std::string& space, const SpaceStatistics& statistic
                         : fmt::format("  below {} queued", Grouped(statistics.queuedDeletions)));
   text += AmountRow("unreachable", statistics.unreachable);
   text += AmountRow("meta values", statistics.meta);
+  const std::vector<std::int64_t> readers = ReadersElsewhere(statistics);
+  if (!readers.empty()) {
+    text += fmt::format("  {:<18} {:>14} {:>12}  {}\n", "reading processes", readers.size(), "",
+                        fmt::join(readers, ", "));
+  }
   return text;
 }
 

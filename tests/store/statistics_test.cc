@@ -6,6 +6,7 @@
 #include <algorithm>
 #include <map>
 #include <ostream>
+#include <set>
 
 #include "store/envelope.h"
 #include "store/transaction.h"
@@ -255,14 +256,17 @@ TEST_F(Statistics, LeaveAnOpenTransactionsChangesOut) {
   EXPECT_EQ(MapOf(Collect(), "t").entries, 150u);
 }
 
-TEST_F(Statistics, CountTheOpenSnapshots) {
-  Snapshot first(*m_space);
-  EXPECT_EQ(CollectStatistics(first).openSnapshots, 1u);
+TEST_F(Statistics, ListWhoReads) {
+  Snapshot first(*m_space, "first");
+  EXPECT_EQ(CollectStatistics(first).readers.size(), 1u);
   {
-    const Snapshot second(*m_space);
-    EXPECT_EQ(CollectStatistics(first).openSnapshots, 2u);
+    const Snapshot second(*m_space, "second");
+    const std::vector<ReaderInfo> readers = CollectStatistics(first).readers;
+    std::set<std::string> owners;  // both are of the same age, as far as the clock can tell
+    for (const ReaderInfo& reader : readers) owners.insert(reader.owner);
+    EXPECT_EQ(owners, (std::set<std::string>{"first", "second"}));
   }
-  EXPECT_EQ(CollectStatistics(first).openSnapshots, 1u);
+  EXPECT_EQ(CollectStatistics(first).readers.size(), 1u);
 }
 
 TEST_F(Statistics, LoadNoNodeIntoTheSnapshot) {

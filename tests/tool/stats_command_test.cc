@@ -1,4 +1,6 @@
 // `vemo stats`, beside the library's own figures.
+#include <unistd.h>
+
 #include <nlohmann/json.hpp>
 
 #include "store/statistics.h"
@@ -111,6 +113,18 @@ TEST_F(StatsCommand, PrintsAsJsonWhatTheLibraryCounts) {
     EXPECT_EQ(level.at("fill").at("least"), counted.levels[i].LeastFill());
     EXPECT_EQ(level.at("fill").at("most"), counted.levels[i].MostFill());
   }
+}
+
+TEST_F(StatsCommand, NamesTheOtherProcessesThatReadTheSpace) {
+  FillRoot("a", 1);
+  EXPECT_EQ(Output().find("reading processes"), std::string::npos);
+  EXPECT_TRUE(Json::parse(Output({"--json"})).at("reading_processes").empty());
+  const auto space = CSpace::Open(uri());
+  const Snapshot snapshot(*space);
+  const std::string self = std::to_string(getpid());
+  EXPECT_NE(Output().find("\n  reading processes               1               " + self + "\n"),
+            std::string::npos);
+  EXPECT_EQ(Json::parse(Output({"--json"})).at("reading_processes"), Json::array({getpid()}));
 }
 
 TEST_F(StatsCommand, PrintsNamesOfAnyBytes) {
