@@ -1,18 +1,12 @@
 // The recorded sessions, where they are at hand: next to the source folder or in VEMO_DATA_DIR.
 #include <gtest/gtest.h>
 
-#include <cstdlib>
-
 #include "edit_model.h"
 #include "history/edit_source.h"
+#include "recordings.h"
 
 namespace vemo::test {
 namespace {
-
-std::filesystem::path DataFolder() {
-  if (const char* folder = std::getenv("VEMO_DATA_DIR")) return folder;
-  return VEMO_SOURCE_DIR "/../shared/data";
-}
 
 struct Sizes {
   const char* name;

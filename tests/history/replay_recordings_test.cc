@@ -2,21 +2,16 @@
 // VEMO_DATA_DIR.
 #include <gtest/gtest.h>
 
-#include <cstdlib>
 #include <filesystem>
 
 #include "history/source_error.h"
 #include "history/verify_history.h"
 #include "recorded_fields.h"
+#include "recordings.h"
 #include "tests/support/temp_folder.h"
 
 namespace vemo::test {
 namespace {
-
-std::filesystem::path DataFolder() {
-  if (const char* folder = std::getenv("VEMO_DATA_DIR")) return folder;
-  return VEMO_SOURCE_DIR "/../shared/data";
-}
 
 struct Counts {
   const char* name;

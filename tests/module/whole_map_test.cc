@@ -273,7 +273,7 @@ TEST_F(WholeMap, ValidationChecksOrderAndBounds) {
 TEST_F(WholeMap, ValidationComparesEachLevelWithItsOwnParentOnly) {
   // The last leaf of the left node reaches beyond the root's separator, which only its grandparent knows.
   EXPECT_EQ(ValidateTextOf("(([1 2] 3 [3 4] 5 [5 15]) 10 ([10 11] 12 [12 13] 14 [14 15]))"),
-            "root.-1.1: above its range: 15:\n");
+            "root.-1.1: key 15: is above its range\n");
 }
 
 TEST_F(WholeMap, ValidationIgnoresSizeAndChain) {
@@ -282,7 +282,10 @@ TEST_F(WholeMap, ValidationIgnoresSizeAndChain) {
   Leaf(2)->m_prev.Clear();
   map.m_lastLeaf = Leaf(1);
   map.Validate();
-  EXPECT_EQ(TreeFaults(), "chain at leaf 1: wrong predecessor\nwrong last leaf\nsize 7, but 4 entries\n");
+  EXPECT_EQ(TreeFaults(),
+            "map: its last leaf is not the tree's\n"
+            "leaf 1: its left neighbour is not the tree's\n"
+            "map: the size is 7, but there are 4 entries\n");
 }
 
 class ProductionWholeMap : public MapFixture<FieldIdToVectorInsertionsMap> {};
