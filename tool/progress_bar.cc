@@ -48,7 +48,8 @@ void ProgressBar::Draw(std::uint64_t done, double seconds) {
   const double share = std::min(1.0, static_cast<double>(done) / static_cast<double>(m_total));
   const int filled = static_cast<int>(share * kWidth);
   const double rate = static_cast<double>(done) / seconds;
-  const auto left = static_cast<std::uint64_t>(rate > 0 ? static_cast<double>(m_total - std::min(done, m_total)) / rate : 0);
+  const auto left = static_cast<std::uint64_t>(
+      rate > 0 ? static_cast<double>(m_total - std::min(done, m_total)) / rate : 0);
   fmt::print(m_terminal, "\r\033[K{} {:3.0f}% [{:<{}}] {}/{}  {}/s  {}:{:02} left", m_verb, share * 100,
              std::string(static_cast<std::size_t>(filled), '='), kWidth, Grouped(done), Grouped(m_total),
              Grouped(static_cast<std::uint64_t>(rate)), left / 60, left % 60);

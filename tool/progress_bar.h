@@ -9,15 +9,16 @@
 
 namespace vemo::tool {
 
-// Draws "verb  42% [====    ] 1,234/5,678  90,123/s  0:07 left" on standard error where that is a terminal, from one
-// second on and a few times a second; elsewhere it does nothing. The destructor wipes it.
+// Draws "verb  42% [====    ] 1,234/5,678  90,123/s  0:07 left" on standard error where that is a terminal,
+// from one second on and a few times a second; elsewhere it does nothing. The destructor wipes it.
 class ProgressBar {
  public:
   using Clock = std::chrono::steady_clock;
 
   ProgressBar(std::string verb, std::uint64_t total);
   // Draws on `terminal`, or not at all where that is null, by the time that `now` tells.
-  ProgressBar(std::string verb, std::uint64_t total, std::FILE* terminal, std::function<Clock::time_point()> now);
+  ProgressBar(std::string verb, std::uint64_t total, std::FILE* terminal,
+              std::function<Clock::time_point()> now);
   ~ProgressBar();
   ProgressBar(const ProgressBar&) = delete;
   ProgressBar& operator=(const ProgressBar&) = delete;

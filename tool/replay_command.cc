@@ -36,7 +36,8 @@ std::unique_ptr<EditSource> OpenSource(const ReplayArguments& arguments) {
     throw UsageError("name either a recording, with --field, or a repository, with --git");
   }
   if (!arguments.repository.empty()) return OpenGitHistory(arguments.repository, arguments.revision);
-  if (arguments.field.empty()) throw UsageError("a recording needs --field to say where it goes, such as --field 1:0");
+  if (arguments.field.empty())
+    throw UsageError("a recording needs --field to say where it goes, such as --field 1:0");
   return OpenTrace(arguments.file, ParseFieldId(arguments.field), arguments.author);
 }
 
@@ -51,8 +52,10 @@ void PrintMap(Snapshot& snapshot, const char* name, const Count& count) {
 
 void PrintMaps(Snapshot& snapshot) {
   fmt::print("  {:<12} {:>10} {:>10} {:>8} {:>12}\n", "map", "fields", "nodes", "height", "runs");
-  PrintMap<FieldIdToVectorInsertionsMap>(snapshot, kInsertionsRoot, [](const auto& p) { return p.m_c.size(); });
-  PrintMap<FieldIdToVectorTombstonesMap>(snapshot, kTombstonesRoot, [](const auto& p) { return p.m_tombstones.size(); });
+  PrintMap<FieldIdToVectorInsertionsMap>(snapshot, kInsertionsRoot,
+                                         [](const auto& p) { return p.m_c.size(); });
+  PrintMap<FieldIdToVectorTombstonesMap>(snapshot, kTombstonesRoot,
+                                         [](const auto& p) { return p.m_tombstones.size(); });
   PrintMap<FieldIdToVectorInsertionsAndDeletionsMap>(
       snapshot, kHistoryRoot, [](const auto& p) { return p.m_insertions.m_c.size() + p.m_deletions.size(); });
 }
@@ -62,31 +65,52 @@ void PrintReport(const ReplayReport& report, double seconds) {
     fmt::print("  {:<18} {:>14}{}{}\n", what, Grouped(count), note.empty() ? "" : "  ", note);
   };
   row("edits", report.edits,
-      report.editsApplied == report.edits ? "" : fmt::format("of which {} now", Grouped(report.editsApplied)));
+      report.editsApplied == report.edits ? ""
+                                          : fmt::format("of which {} now", Grouped(report.editsApplied)));
   row("elements inserted", report.elementsInserted, "");
   row("elements deleted", report.elementsDeleted, "");
   row("authors", report.sites, "");
-  if (report.sourceCommits > 0) row("files", report.objects, fmt::format("in {} git commits", Grouped(report.sourceCommits)));
+  if (report.sourceCommits > 0)
+    row("files", report.objects, fmt::format("in {} git commits", Grouped(report.sourceCommits)));
   row("store commits", report.storeCommits,
       fmt::format("in {:.2f} s, {} edits/s", seconds,
-                  Grouped(static_cast<std::uint64_t>(static_cast<double>(report.editsApplied) / std::max(seconds, 1e-9)))));
+                  Grouped(static_cast<std::uint64_t>(static_cast<double>(report.editsApplied) /
+                                                     std::max(seconds, 1e-9)))));
 }
 
 void PrintSkipped(const SkippedFiles& skipped) {
   if (skipped.binary + skipped.symlinks + skipped.submodules == 0) return;
   fmt::print("  {:<18} {:>14}  binary {}, symbolic links {}, submodules {}\n", "paths skipped",
-             Grouped(skipped.binary + skipped.symlinks + skipped.submodules), skipped.binary, skipped.symlinks,
-             skipped.submodules);
+             Grouped(skipped.binary + skipped.symlinks + skipped.submodules), skipped.binary,
+             skipped.symlinks, skipped.submodules);
+}
+
+// Reads the history of a repository once, to find out what there is to replay.
+std::uint64_t CountEdits(EditSource& source) {
+  std::optional<ProgressBar> bar;
+  source.ReportScanTo([&bar](std::uint64_t done, std::uint64_t of) {
+    if (!bar) bar.emplace("reading the history", of);
+    bar->Update(done);
+  });
+  const std::uint64_t edits = source.CountEdits();
+  source.ReportScanTo({});
+  return edits;
+}
+
+std::optional<std::string> Check(CSpace& space, EditSource& source, std::uint64_t edits) {
+  ProgressBar bar("checking", edits);
+  return CheckReplay(space, source, [&bar](std::uint64_t done) { bar.Update(done); });
 }
 
 ExitCode RunReplay(const ReplayArguments& arguments) {
   if (arguments.batch < 1) throw UsageError("--batch: a batch has at least 1 edit");
   const std::unique_ptr<EditSource> source = OpenSource(arguments);
+  const std::uint64_t edits = CountEdits(*source);
   auto space = CSpace::Open(arguments.store, {.create = true});
   const auto start = std::chrono::steady_clock::now();
   ReplayReport report;
   {
-    ProgressBar bar("replaying", source->CountEdits());
+    ProgressBar bar("replaying", edits);
     ReplayOptions options;
     options.batchEdits = static_cast<std::uint64_t>(arguments.batch);
     options.resume = arguments.resume;
@@ -111,7 +135,7 @@ ExitCode RunReplay(const ReplayArguments& arguments) {
     fmt::print("  {} records, {}\n", Grouped(usage.records), ByteSize(usage.bytes));
   }
   if (!arguments.check) return kGood;
-  if (const std::optional<std::string> difference = CheckReplay(*space, *source)) {
+  if (const std::optional<std::string> difference = Check(*space, *source, edits)) {
     fmt::print("{}\n", OneLine(*difference));
     return kFinding;
   }
@@ -123,16 +147,20 @@ ExitCode RunReplay(const ReplayArguments& arguments) {
 
 void AddReplayCommand(CLI::App& app, Command& chosen) {
   auto arguments = std::make_shared<ReplayArguments>();
-  CLI::App* command = app.add_subcommand("replay", "Record the edits of a session or of a git repository in a space");
-  command->add_option("--store", arguments->store, "The space, made if it is not there: lmdb:PATH or memory:")->required();
+  CLI::App* command =
+      app.add_subcommand("replay", "Record the edits of a session or of a git repository in a space");
+  command->add_option("--store", arguments->store, "The space, made if it is not there: lmdb:PATH or memory:")
+      ->required();
   command->add_option("file", arguments->file, "A recorded session, JSON, plain or gzip");
-  command->add_option("--field", arguments->field, "The field that the recording edits, such as 1:0 (object 1, path 0)");
-  command->add_option("--author", arguments->author, "Whose site the recording's operations are")->capture_default_str();
-  command->add_option("--git", arguments->repository, "A git repository: its first-parent history is replayed");
+  command->add_option("--field", arguments->field,
+                      "The field that the recording edits, such as 1:0 (object 1, path 0)");
+  command->add_option("--author", arguments->author, "Whose site the recording's operations are")
+      ->capture_default_str();
+  command->add_option("--git", arguments->repository,
+                      "A git repository: its first-parent history is replayed");
   command->add_option("--rev", arguments->revision, "The commit up to which the repository is replayed")
       ->capture_default_str();
-  command->add_option("--batch", arguments->batch, "Commit after this many edits")
-      ->capture_default_str();
+  command->add_option("--batch", arguments->batch, "Commit after this many edits")->capture_default_str();
   command->add_flag("--resume", arguments->resume, "Go on after the last edit that the space has recorded");
   command->add_flag("--check", arguments->check,
                     "Open the space anew, rebuild every content from it and compare it with the source");
