@@ -32,8 +32,9 @@ struct SiteTexts {
 // Numbers the source's elements as the recorder did.
 class TextCollector : public EditVisitor {
  public:
-  TextCollector(const Snapshot& snapshot, std::string prefix)
-      : m_snapshot(snapshot), m_prefix(std::move(prefix)) {}
+  TextCollector(const Snapshot& snapshot, std::string prefix,
+                const std::function<void(std::uint64_t editsRead)>& progress)
+      : m_snapshot(snapshot), m_prefix(std::move(prefix)), m_progress(progress) {}
 
   void OnSite(const Guid& site, std::string_view) override {
     const std::string name = m_prefix + "start/" + GuidText(site);
@@ -50,6 +51,8 @@ class TextCollector : public EditVisitor {
       texts.ends.push_back(texts.text.size());
     }
     m_fields.insert(edit.field);
+    ++m_editsRead;
+    if (m_progress) m_progress(m_editsRead);
   }
 
   const SiteTexts* TextsOf(const Guid& site) const {
@@ -61,6 +64,8 @@ class TextCollector : public EditVisitor {
  private:
   const Snapshot& m_snapshot;
   std::string m_prefix;
+  const std::function<void(std::uint64_t editsRead)>& m_progress;
+  std::uint64_t m_editsRead = 0;
   std::unordered_map<Guid, SiteTexts, GuidHash> m_texts;
   std::unordered_set<FieldId, FieldIdHash> m_fields;
 };
@@ -116,11 +121,12 @@ std::optional<std::string> Difference(const FinalContent& expected, const Rebuil
 
 }  // namespace
 
-std::optional<std::string> CheckReplay(CSpace& space, EditSource& source) {
+std::optional<std::string> CheckReplay(CSpace& space, EditSource& source,
+                                       const std::function<void(std::uint64_t editsRead)>& progress) {
   Snapshot snapshot(space);
   const auto& insertions = snapshot.Root<FieldIdToVectorInsertionsMap>(kInsertionsRoot);
   const auto& tombstones = snapshot.Root<FieldIdToVectorTombstonesMap>(kTombstonesRoot);
-  TextCollector texts(snapshot, ReplayMetaPrefix(source));
+  TextCollector texts(snapshot, ReplayMetaPrefix(source), progress);
   source.Replay(texts);
 
   const auto compare = [&](const FinalContent& expected) {

@@ -81,6 +81,9 @@ class EditSource {
   // The one field that a recording edits; nothing for a repository, which has a field for each file.
   virtual std::optional<FieldId> OnlyField() const = 0;
 
+  // From now on, `progress` is told how far the first reading of a whole history has come. A recording has no such reading.
+  virtual void ReportScanTo(std::function<void(std::uint64_t done, std::uint64_t of)>) {}
+
   // How many times Replay calls OnEdit. Git: the first call reads the whole history.
   virtual std::uint64_t CountEdits() = 0;
 

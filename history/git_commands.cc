@@ -63,6 +63,12 @@ std::vector<std::string> LogCommand(const std::filesystem::path& repository,
   return arguments;
 }
 
+std::vector<std::string> CountCommitsCommand(const std::filesystem::path& repository, std::string_view commit) {
+  auto arguments = CommandIn(repository, {"rev-list", "--count", "--first-parent", "--end-of-options"});
+  arguments.push_back(std::string(commit));
+  return arguments;
+}
+
 std::vector<std::string> ListFilesCommand(const std::filesystem::path& repository, std::string_view commit) {
   auto arguments = CommandIn(repository, {"ls-tree", "-r", "-z", "--full-tree", "--end-of-options"});
   arguments.push_back(std::string(commit));

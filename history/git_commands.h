@@ -27,6 +27,9 @@ std::vector<std::string> ListBinarySettingsCommand(const std::filesystem::path& 
 std::vector<std::string> LogCommand(const std::filesystem::path& repository,
                                     const std::vector<std::string>& binarySettings, std::string_view commit);
 
+// Prints how many commits that history has.
+std::vector<std::string> CountCommitsCommand(const std::filesystem::path& repository, std::string_view commit);
+
 // Prints the files of `commit`, each as "MODE TYPE ID", a tab, the path and a NUL.
 std::vector<std::string> ListFilesCommand(const std::filesystem::path& repository, std::string_view commit);
 

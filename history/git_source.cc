@@ -43,6 +43,23 @@ std::optional<std::size_t> BlobSize(std::string_view header, std::string_view bl
   return size;
 }
 
+using ScanProgress = std::function<void(std::uint64_t done, std::uint64_t of)>;
+
+// The first pass, telling how many of `of` commits it has read.
+class ReportingScan : public GitHistoryScan {
+ public:
+  ReportingScan(const ScanProgress& progress, std::uint64_t of) : m_progress(progress), m_of(of) {}
+  void OnLogCommit(std::string_view id, std::string_view author) override {
+    GitHistoryScan::OnLogCommit(id, author);
+    if (m_progress) m_progress(++m_done, m_of);
+  }
+
+ private:
+  const ScanProgress& m_progress;
+  std::uint64_t m_of;
+  std::uint64_t m_done = 0;
+};
+
 class GitSource : public EditSource {
  public:
   GitSource(std::filesystem::path repository, std::string commit)
@@ -54,6 +71,7 @@ class GitSource : public EditSource {
   std::string Describe() const override {
     return "git repository " + m_repository.string() + " at " + m_commit;
   }
+  void ReportScanTo(ScanProgress progress) override { m_scanProgress = std::move(progress); }
   std::uint64_t CountEdits() override { return History().edits; }
   SkippedFiles Skipped() override { return History().skipped; }
 
@@ -67,22 +85,35 @@ class GitSource : public EditSource {
 
  private:
   const GitHistory& History();
+  std::uint64_t CountCommits() const;
   void ReadLog(GitLogVisitor& visitor) const;
   std::vector<TreeFile> ListTextFiles();
 
   std::filesystem::path m_repository;
   std::string m_commit;
   std::vector<std::string> m_binarySettings;
+  ScanProgress m_scanProgress;
   std::optional<GitHistory> m_history;  // after the first pass
 };
 
 const GitHistory& GitSource::History() {
   if (!m_history) {
-    GitHistoryScan scan;
+    ReportingScan scan(m_scanProgress, m_scanProgress ? CountCommits() : 0);
     ReadLog(scan);
     m_history = scan.Take();
   }
   return *m_history;
+}
+
+std::uint64_t GitSource::CountCommits() const {
+  GitProcess git(CountCommitsCommand(m_repository, m_commit));
+  const std::string line(git.ReadLine().value_or(""));
+  git.Finish();
+  std::uint64_t commits = 0;
+  if (std::from_chars(line.data(), line.data() + line.size(), commits).ec != std::errc()) {
+    throw SourceError("git printed a count of commits that cannot be understood");
+  }
+  return commits;
 }
 
 void GitSource::ReadLog(GitLogVisitor& visitor) const {

@@ -50,7 +50,9 @@ ReplayReport Replay(CSpace& space, EditSource& source, const ReplayOptions& opti
 // Rebuilds the content of every field of the source from the stored maps and the inserted texts, and compares it with the
 // source's own final content, byte for byte; live elements and, for a repository, fields that are none of the source's
 // differ as well. Returns what differs first, or nothing. Holds the inserted texts in memory.
-std::optional<std::string> CheckReplay(CSpace& space, EditSource& source);
+// `progress`, which may be empty, is told how many of the source's edits have been read.
+std::optional<std::string> CheckReplay(CSpace& space, EditSource& source,
+                                       const std::function<void(std::uint64_t editsRead)>& progress = {});
 
 // The names of meta values.
 std::string SiteMetaName(const Guid& site);
