@@ -4,13 +4,13 @@
 
 #include <sys/resource.h>
 #include <unistd.h>
-#include <set>
-#include <sstream>
 
 #include <algorithm>
 #include <bit>
 #include <cerrno>
 #include <memory>
+#include <set>
+#include <sstream>
 
 #include "engines/lmdb/lmdb_error.h"
 #include "platform/error.h"

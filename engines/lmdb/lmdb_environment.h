@@ -3,12 +3,10 @@
 // 1. m_writing serialises write transactions, m_state guards the count of snapshots and the beginning of read
 //    transactions. Who takes both takes m_writing first.
 // 2. The environment handle and the map change only under both locks and while no snapshot is open: LMDB must
-// not remap
-//    or close under a transaction of this process. m_env is null only after a failed attempt to open it
-//    again.
+//    not remap or close under a transaction of this process. m_env is null only after a failed attempt to open
+//    it again.
 // 3. After fork the child never calls LMDB with this environment: not to close it either, which would release
-// the
-//    parent's reader slots.
+//    the parent's reader slots.
 #pragma once
 
 #include <sys/types.h>

@@ -135,7 +135,7 @@ TEST_P(SnapshotTest, OtherThreadsReadTheirSnapshotsWhileThisOneCommits) {
   CommitFilled<TombstonesMap>(space(), "t", 1);
   constexpr std::uint64_t kCommits = 60;
   std::vector<std::thread> readers;
-  for (int reader = 0; reader < 3; ++reader) {
+  for (int reader = 0; reader < 4; ++reader) {
     readers.emplace_back([&] {
       for (std::uint64_t seen = 0; seen < kCommits;) {
         Snapshot snapshot(space());
