@@ -182,10 +182,9 @@ class TFieldMap : public PersistableMixin<IObjectBaseMixin<typename Traits::Map,
   // `change` passes through, and the transaction cannot be committed any more.
   template <class Change>
   bool Edit(const FieldId& key, Change&& change);
-  // Fills an empty map with entries in strictly ascending order of keys. Leaves get `fill` (0.5 to 1) of their capacity, where
-  // inserting one by one in ascending order leaves them half full; levels above are filled alike. Linear; holds one reference
-  // and key a leaf besides. Throws UsageError when the map is not empty, the keys do not ascend or `fill` is out of range; keys
-  // out of order are met on the way, and the transaction can then only be aborted.
+  // Fills an empty map with entries in strictly ascending order of keys. Leaves get `fill` (0.5 to 1) of their capacity (one by
+  // one, ascending, they stay half full), as do the levels above. Linear; holds a reference and a key a leaf. Throws UsageError
+  // if the map is not empty, `fill` out of range, or a key out of order, which is met on the way and poisons the transaction.
   template <class Iterator>
   void BulkLoad(Iterator first, Iterator last, double fill = 1.0);
   // The payload under `key`, made if missing, for changing: the leaf is marked.
