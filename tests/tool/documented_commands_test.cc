@@ -39,6 +39,8 @@ TEST_F(DocumentedCommandsTest, WorkInTheOrderInWhichTheyStand) {
   std::size_t run = 0;
   for (const auto& document : documents) {
     for (std::string command : CommandsOf(document)) {
+      const bool wantsRecordings = command.find("../shared/data/") != std::string::npos;
+      if (wantsRecordings && !std::filesystem::exists(source / "../shared/data")) continue;
       ReplaceAll(command, "/tmp/", path("").string());
       ReplaceAll(command, "build/vemo", VEMO_BINARY_DIR "/vemo");  // after: the build may be below /tmp/ too
       const Outcome outcome =
