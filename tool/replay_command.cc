@@ -25,7 +25,7 @@ struct ReplayArguments {
   std::string field;
   std::string author = "recorded author";
   std::string repository;
-  std::string revision = "HEAD";
+  std::string revision;  // empty: HEAD
   std::int64_t batch = 10'000;
   bool resume = false;
   bool check = false;
@@ -35,7 +35,11 @@ std::unique_ptr<EditSource> OpenSource(const ReplayArguments& arguments) {
   if (arguments.file.empty() == arguments.repository.empty()) {
     throw UsageError("name either a recording, with --field, or a repository, with --git");
   }
-  if (!arguments.repository.empty()) return OpenGitHistory(arguments.repository, arguments.revision);
+  if (!arguments.repository.empty()) {
+    if (!arguments.field.empty()) throw UsageError("--field is for a recording; a repository has a field for each file");
+    return OpenGitHistory(arguments.repository, arguments.revision.empty() ? "HEAD" : arguments.revision);
+  }
+  if (!arguments.revision.empty()) throw UsageError("--rev names a commit of a repository; a recording has none");
   if (arguments.field.empty())
     throw UsageError("a recording needs --field to say where it goes, such as --field 1:0");
   return OpenTrace(arguments.file, ParseFieldId(arguments.field), arguments.author);
@@ -158,8 +162,7 @@ void AddReplayCommand(CLI::App& app, Command& chosen) {
       ->capture_default_str();
   command->add_option("--git", arguments->repository,
                       "A git repository: its first-parent history is replayed");
-  command->add_option("--rev", arguments->revision, "The commit up to which the repository is replayed")
-      ->capture_default_str();
+  command->add_option("--rev", arguments->revision, "The commit up to which the repository is replayed (default HEAD)");
   command->add_option("--batch", arguments->batch, "Commit after this many edits")->capture_default_str();
   command->add_flag("--resume", arguments->resume, "Go on after the last edit that the space has recorded");
   command->add_flag("--check", arguments->check,

@@ -55,6 +55,13 @@ TEST_F(RefusalsTest, OfAReplayWithoutASourceOrWithTwo) {
   EXPECT_EQ(RefusedReplay({"--git", ".", SmallRecording(), "--field", "1:0"}), refusal);
 }
 
+TEST_F(RefusalsTest, OfOptionsThatBelongToTheOtherSource) {
+  EXPECT_EQ(RefusedReplay({"--git", ".", "--field", "1:0"}),
+            "vemo: --field is for a recording; a repository has a field for each file");
+  EXPECT_EQ(RefusedReplay({SmallRecording(), "--field", "1:0", "--rev", "HEAD"}),
+            "vemo: --rev names a commit of a repository; a recording has none");
+}
+
 TEST_F(RefusalsTest, OfABatchWithoutEdits) {
   for (const char* batch : {"0", "00", "-1"}) {
     EXPECT_EQ(RefusedReplay({SmallRecording(), "--field", "1:0", "--batch", batch}),
