@@ -1,6 +1,6 @@
 // The objects of one state of a space that are in memory.
 //
-//                    Adopt                 (commit)              
+//                    Adopt                 (commit)
 //        [made] ------------> new --------------------+
 //                              |                      v       MarkDirty
 //   [stored] -- Resolve ---------------------------> clean <------------> dirty
