@@ -1,0 +1,48 @@
+// A set of object ids that takes about one bit for each id of the ranges that it holds.
+//
+// Ids are handed out in sequence, so those of a space lie close together, and a set of all of them is a bitmap with few
+// holes. The bitmap is cut into chunks that are found by a hash table: an id far off, such as a damaged reference names, costs
+// one chunk and not the distance.
+//
+// Threads: one at a time; constant functions may run beside one another.
+#pragma once
+
+#include <array>
+#include <cstddef>
+#include <cstdint>
+#include <unordered_map>
+
+#include "platform/oid.h"
+
+namespace vemo {
+
+class IdSet {
+ public:
+  // The ids that share a chunk, of which the first is a multiple of this: 512 bytes of bits.
+  static constexpr std::uint64_t kIdsPerChunk = 4'096;
+
+  // Returns whether the id was not in the set. Constant time; throws std::bad_alloc, which leaves the set as it was.
+  bool Insert(OID oid);
+  // Returns whether the id was in the set. A chunk without ids gives its memory back.
+  bool Erase(OID oid) noexcept;
+  bool Contains(OID oid) const noexcept;
+
+  std::size_t size() const noexcept { return m_size; }
+  bool empty() const noexcept { return m_size == 0; }
+  void clear() noexcept;
+  void swap(IdSet& other) noexcept;
+
+  // What the set takes on the heap: chunks, and what the hash table takes for each.
+  std::size_t MemoryBytes() const noexcept;
+
+ private:
+  struct Chunk {
+    std::array<std::uint64_t, kIdsPerChunk / 64> words{};
+    std::uint32_t count = 0;
+  };
+
+  std::unordered_map<std::uint64_t, Chunk> m_chunks;  // by id / kIdsPerChunk
+  std::size_t m_size = 0;
+};
+
+}  // namespace vemo
