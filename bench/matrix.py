@@ -4,7 +4,7 @@ import subprocess
 from dataclasses import dataclass
 
 OURS = "vemo"
-PROGRAMS = ("map_bench",)
+PROGRAMS = ("map_bench", "store_bench")
 
 # The first line that fits a workload decides its sizes.
 SIZES = {

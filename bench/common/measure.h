@@ -41,8 +41,10 @@ template <class Section>
 
 // Bytes that malloc has given out and not got back, its own headers included.
 std::uint64_t AllocatedBytes();
-// The most memory that this process has had resident so far, in KiB.
-std::uint64_t PeakResidentKib();
+// From now on the peak counts anew; returns what is resident now, in bytes.
+std::uint64_t ResetPeakResident();
+// The most memory that this process has had resident since then, in bytes, pages of mapped files included.
+std::uint64_t PeakResidentBytes();
 
 // One line of JSON on standard output, which bench/driver.py reads.
 std::string ToJsonLine(const Measurement& measurement, std::size_t size, std::string_view peer);

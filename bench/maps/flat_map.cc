@@ -1,4 +1,5 @@
 #include <boost/container/flat_map.hpp>
+#include <iterator>
 
 #include "bench/maps/map_workloads.h"
 #include "bench/maps/standard_map.h"
@@ -21,7 +22,10 @@ class FlatMap : public StandardMap<boost::container::flat_map<FieldId, Payload>>
     for (std::size_t i = 0; i < keys.size(); ++i) entries.emplace_back(keys[i], payloads[i]);
     std::sort(entries.begin(), entries.end(), [](const auto& a, const auto& b) { return a.first < b.first; });
     this->m_map.reserve(keys.size());
-    this->m_map.insert(boost::container::ordered_unique_range, entries.begin(), entries.end());
+    // Moved, so that the payloads' buffers lie as they were made, in the order of insertion, as everywhere
+    // else.
+    this->m_map.insert(boost::container::ordered_unique_range, std::make_move_iterator(entries.begin()),
+                       std::make_move_iterator(entries.end()));
   }
 };
 

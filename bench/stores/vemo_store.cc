@@ -1,0 +1,71 @@
+#include <memory>
+#include <optional>
+#include <utility>
+
+#include "bench/common/entries.h"
+#include "bench/stores/bytes_peer.h"
+#include "bench/stores/store_peer.h"
+#include "vemo/store.h"
+
+namespace vemo::bench {
+
+namespace {
+
+template <class Map>
+class VemoStorePeer : public StorePeer {
+ public:
+  using Payload = typename Map::mapped_type;
+
+  explicit VemoStorePeer(const StoreSetup& setup) {
+    SpaceOptions options;
+    options.create = true;
+    m_space = CSpace::Open("lmdb:" + (setup.folder / "space").string(), options);
+  }
+
+  void Begin() override {
+    m_transaction.emplace(*m_space);
+    m_map = &m_transaction->Root<Map>("measured");
+  }
+  void Put(const FieldId& key, std::size_t payload) override {
+    m_map->Insert(key, m_payloads[payload], true);
+  }
+  void Erase(const FieldId& key) override { m_map->Delete(key); }
+  void Commit() override {
+    m_transaction->Commit();
+    m_transaction.reset();
+  }
+
+  void StartReading() override {
+    m_snapshot.emplace(*m_space);
+    m_read = &m_snapshot->Root<Map>("measured");
+  }
+  std::uint64_t Find(const FieldId& key) override {
+    const Payload* payload = m_read->rFind(key);
+    return payload != nullptr ? PayloadKind<Payload>::Read(*payload) : 0;
+  }
+  std::uint64_t Scan() override {
+    std::uint64_t sum = 0;
+    for (const auto& entry : *m_read) sum = ScanStep(sum, PayloadKind<Payload>::Read(entry.second));
+    return sum;
+  }
+
+ private:
+  PayloadPool<Payload> m_payloads;
+  std::unique_ptr<CSpace> m_space;
+  std::optional<WriteTransaction> m_transaction;
+  std::optional<Snapshot> m_snapshot;
+  Map* m_map = nullptr;
+  const Map* m_read = nullptr;
+};
+
+}  // namespace
+
+StoreKind VemoStore() {
+  return {"vemo", StoreRole::kStore, false, [](const StoreSetup& setup) -> std::unique_ptr<StorePeer> {
+            if (setup.payload == StorePayload::kTombstones)
+              return std::make_unique<VemoStorePeer<FieldIdToVectorTombstonesMap>>(setup);
+            return std::make_unique<VemoStorePeer<FieldIdToVectorInsertionsMap>>(setup);
+          }};
+}
+
+}  // namespace vemo::bench
