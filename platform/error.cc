@@ -22,6 +22,7 @@ class ErrorCategory : public std::error_category {
       case ErrorCode::kCorruptRecord: return "corrupt record";
       case ErrorCode::kDanglingReference: return "dangling reference";
       case ErrorCode::kSnapshotExpired: return "snapshot expired";
+      case ErrorCode::kUnknownOutcome: return "unknown outcome";
     }
     return "unknown error";
   }
@@ -36,7 +37,8 @@ class ErrorCategory : public std::error_category {
       case ErrorCode::kSpaceBusy:
       case ErrorCode::kSnapshotExpired: return make_error_condition(Remedy::kRetry);
       case ErrorCode::kStaleGeneration:
-      case ErrorCode::kPoisonedTransaction: return make_error_condition(Remedy::kAbandonTransaction);
+      case ErrorCode::kPoisonedTransaction:
+      case ErrorCode::kUnknownOutcome: return make_error_condition(Remedy::kAbandonTransaction);
       case ErrorCode::kStoreFailed: return make_error_condition(Remedy::kCloseSpace);
       case ErrorCode::kCorruptRecord:
       case ErrorCode::kDanglingReference: return make_error_condition(Remedy::kRestoreData);

@@ -27,6 +27,7 @@ enum class ErrorCode {
   kCorruptRecord,
   kDanglingReference,
   kSnapshotExpired,
+  kUnknownOutcome,
 };
 
 // What a caller can do.

@@ -99,8 +99,9 @@ class Engine {
   virtual std::unique_ptr<EngineSnapshot> OpenSnapshot() = 0;
 
   // Applies `batch` and returns the new generation, `batch.expectedGeneration` + 1. Once it has returned, the commit
-  // survives the end of the process and, for engines on a disk, power loss. Throws StaleGeneration, or another
-  // StoreError; then nothing was applied.
+  // survives the end of the process and, for engines on a disk, power loss. Throws UnknownOutcome when it cannot tell
+  // whether `batch` was applied: a snapshot that is opened afterwards shows it for good. Throws StaleGeneration, or
+  // another StoreError; then nothing was applied.
   virtual std::uint64_t Commit(const CommitBatch& batch) = 0;
 
   // The first of `count` ids (at least 1) that were never handed out before and never will be again. The first id of a

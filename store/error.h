@@ -62,6 +62,14 @@ class StaleGeneration : public StoreError {
   std::error_code code() const noexcept override { return make_error_code(ErrorCode::kStaleGeneration); }
 };
 
+// Nobody can say whether a commit was made: the engine's answer was lost, and the space could not be read to find out. End
+// the transaction; the next one shows whether the change is there.
+class UnknownOutcome : public StoreError {
+ public:
+  using StoreError::StoreError;
+  std::error_code code() const noexcept override { return make_error_code(ErrorCode::kUnknownOutcome); }
+};
+
 // A mutation of this transaction was interrupted half-way: it can only be aborted.
 class PoisonedTransaction : public StoreError {
  public:

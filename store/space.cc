@@ -7,6 +7,7 @@
 #include "engines/memory/memory_engine.h"
 #include "platform/assertion.h"
 #include "platform/variable_length.h"
+#include "store/commit_outcome.h"
 #include "store/envelope.h"
 #include "store/snapshot.h"
 #include "store/transaction.h"
@@ -99,7 +100,7 @@ void CSpace::CheckFormat(bool create) {
   batch.namedValues.push_back(
       {NamedTable::kInfo, std::string(kFormatName), SealNamed(NamedTable::kInfo, kFormatName, value)});
   const auto lock = m_engine->LockWriter(m_options.writerTimeout);
-  if (m_engine->OpenSnapshot()->Generation() == 0) m_engine->Commit(batch);
+  if (m_engine->OpenSnapshot()->Generation() == 0) CommitAndSettle(*m_engine, batch);
 }
 
 void CSpace::Log(LogLevel level, const std::string& message) const {

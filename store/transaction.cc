@@ -6,6 +6,7 @@
 
 #include "platform/error.h"
 #include "store/commit_builder.h"
+#include "store/commit_outcome.h"
 #include "store/envelope.h"
 #include "store/snapshot.h"
 
@@ -412,9 +413,13 @@ void WriteTransaction::Commit() {
     if (!batch.records.empty() || !batch.removedRecords.empty() || !batch.queuedDeletions.empty() ||
         !batch.finishedDeletions.empty() || !batch.namedValues.empty()) {
       view.Detach();  // an open state would keep the engine from growing
-      generation = m_space.m_engine->Commit(batch);
+      generation = CommitAndSettle(*m_space.m_engine, batch);
     }
     AfterCommit(generation, builder.Written());
+  } catch (const UnknownOutcome&) {
+    m_poisoned = true;
+    view.TruncateClassNumbers(classesBefore);
+    throw;
   } catch (...) {
     view.TruncateClassNumbers(classesBefore);
     Reattach();

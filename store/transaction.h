@@ -81,8 +81,9 @@ class WriteTransaction {
 
   // Writes what changed as one atomic, durable commit, and ends the transaction. Throws PoisonedTransaction when a change
   // was interrupted half-way, UsageError when an object refers to a deleted one or into another space, and StoreError
-  // when the engine fails; the transaction then stays open, to be tried again or aborted. Costs a record per changed
-  // object.
+  // when the engine fails; the transaction then stays open, to be tried again or aborted. Throws UnknownOutcome where
+  // even reading the space back does not tell whether the commit was made; the transaction can then only be ended, and
+  // the next one shows the truth. Costs a record per changed object.
   void Commit();
 
   // The objects that a commit would write now, and the size of their records as they would be: for a look before committing.

@@ -1,4 +1,5 @@
 // The engines that the contract runs over.
+#include "engines/faulty/faulty_engine.h"
 #include "engines/lmdb/lmdb_engine.h"
 #include "engines/memory/memory_engine.h"
 #include "tests/engines/engine_contract.h"
@@ -25,11 +26,21 @@ class LmdbSite final : public EngineSite {
   TempFolder m_folder;
 };
 
+// What fails on demand is an engine like any other as long as nothing is demanded.
+class FaultySite final : public EngineSite {
+ public:
+  std::unique_ptr<Engine> Open() override { return MakeFaultyEngine(OpenMemoryEngine(), m_plan); }
+
+ private:
+  FaultPlan m_plan;
+};
+
 }  // namespace
 
 const std::vector<EngineKind>& AllEngineKinds() {
   static const std::vector<EngineKind> kinds{{"memory", false, [] { return std::make_unique<MemorySite>(); }},
-                                             {"lmdb", true, [] { return std::make_unique<LmdbSite>(); }}};
+                                             {"lmdb", true, [] { return std::make_unique<LmdbSite>(); }},
+                                             {"faulty", false, [] { return std::make_unique<FaultySite>(); }}};
   return kinds;
 }
 

@@ -28,6 +28,7 @@ TEST(ErrorCodes, TellClassesApartThroughTheBase) {
   EXPECT_EQ(CodeOf(StaleGeneration(1, 2)), ErrorCode::kStaleGeneration);
   EXPECT_EQ(CodeOf(PoisonedTransaction("")), ErrorCode::kPoisonedTransaction);
   EXPECT_EQ(CodeOf(SnapshotExpired("")), ErrorCode::kSnapshotExpired);
+  EXPECT_EQ(CodeOf(UnknownOutcome("")), ErrorCode::kUnknownOutcome);
   EXPECT_EQ(CodeOf(CorruptRecord("")), ErrorCode::kCorruptRecord);
   EXPECT_EQ(CodeOf(DanglingReference("")), ErrorCode::kDanglingReference);
 }
@@ -38,6 +39,7 @@ TEST(ErrorCodes, NameTheRemedy) {
   EXPECT_EQ(CodeOf(SnapshotExpired("")), Remedy::kRetry);
   EXPECT_EQ(CodeOf(StaleGeneration(1, 2)), Remedy::kAbandonTransaction);
   EXPECT_EQ(CodeOf(PoisonedTransaction("")), Remedy::kAbandonTransaction);
+  EXPECT_EQ(CodeOf(UnknownOutcome("")), Remedy::kAbandonTransaction);
   EXPECT_EQ(CodeOf(StoreError("")), Remedy::kCloseSpace);
   EXPECT_EQ(CodeOf(CorruptRecord("")), Remedy::kRestoreData);
   EXPECT_NE(CodeOf(SpaceBusy("")), Remedy::kCloseSpace);
