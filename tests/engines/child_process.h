@@ -71,6 +71,7 @@ class ChildProcess {
     return WIFEXITED(status) && WEXITSTATUS(status) == 0;
   }
 
+  // Ends the child; what it has said before can still be heard.
   void Kill() {
     ::kill(m_pid, SIGKILL);
     ::waitpid(m_pid, nullptr, 0);

@@ -1,0 +1,88 @@
+// Runs one campaign: campaign NAME [--seed N] [--OPTION N]... The last line is the verdict.
+#include <charconv>
+#include <functional>
+#include <iostream>
+#include <map>
+#include <optional>
+#include <string>
+#include <string_view>
+
+#include "tests/campaigns/kill_loop.h"
+
+namespace vemo::campaign {
+
+namespace {
+
+// The numbers of the command line by name. Each is to be asked for, so that a misspelt one is found.
+class Numbers {
+ public:
+  Numbers(int argc, char** argv) {
+    for (int i = 2; i < argc; i += 2) {
+      const std::string_view name(argv[i]);
+      const std::string_view text(i + 1 < argc ? argv[i + 1] : "");
+      std::uint64_t value = 0;
+      const auto result = std::from_chars(text.data(), text.data() + text.size(), value);
+      if (!name.starts_with("--") || result.ec != std::errc() || result.ptr != text.data() + text.size()) {
+        throw std::invalid_argument(std::string(name) + ": options are --NAME NUMBER");
+      }
+      m_values[std::string(name.substr(2))] = value;
+    }
+  }
+
+  template <class Number>
+  void Take(const std::string& name, Number& number) {
+    const auto found = m_values.find(name);
+    if (found == m_values.end()) return;
+    number = static_cast<Number>(found->second);
+    m_values.erase(found);
+  }
+
+  void RequireAllTaken() const {
+    if (!m_values.empty()) throw std::invalid_argument("there is no option --" + m_values.begin()->first);
+  }
+
+ private:
+  std::map<std::string, std::uint64_t> m_values;
+};
+
+Verdict KillLoop(Numbers& numbers) {
+  KillLoopOptions options;
+  numbers.Take("seed", options.seed);
+  numbers.Take("kills", options.kills);
+  numbers.Take("keys", options.keys);
+  numbers.RequireAllTaken();
+  return RunKillLoop(options);
+}
+
+const std::map<std::string_view, std::function<Verdict(Numbers&)>>& Campaigns() {
+  static const std::map<std::string_view, std::function<Verdict(Numbers&)>> campaigns{{"kill_loop", KillLoop}};
+  return campaigns;
+}
+
+int Run(int argc, char** argv) {
+  const auto campaign = argc > 1 ? Campaigns().find(argv[1]) : Campaigns().end();
+  if (campaign == Campaigns().end()) {
+    std::cerr << "usage: campaign NAME [--seed N] [--OPTION N]...; the names are";
+    for (const auto& [name, run] : Campaigns()) std::cerr << ' ' << name;
+    std::cerr << std::endl;
+    return 2;
+  }
+  Numbers numbers(argc, argv);
+  const Verdict verdict = campaign->second(numbers);
+  for (const std::string& fault : verdict.faults()) std::cout << fault << '\n';
+  std::cout << verdict.Line() << std::endl;
+  return verdict.IsSound() ? 0 : 1;
+}
+
+}  // namespace
+
+}  // namespace vemo::campaign
+
+int main(int argc, char** argv) {
+  try {
+    return vemo::campaign::Run(argc, argv);
+  } catch (const std::exception& error) {
+    std::cerr << error.what() << std::endl;
+    return 2;
+  }
+}
