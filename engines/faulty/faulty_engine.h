@@ -30,8 +30,8 @@ enum class EngineCall : std::uint8_t {
 enum class Fault : std::uint8_t {
   kNoSpace,         // refused for want of space; nothing is done
   kIoError,         // refused by the medium; nothing is done
-  kUnknownApplied,  // done, and reported as UnknownOutcome
-  kUnknownDropped,  // not done, and reported as UnknownOutcome
+  kUnknownApplied,  // done, but the answer is lost: UnknownOutcome
+  kUnknownDropped,  // not done, and the answer is lost: UnknownOutcome
   kDeliveredTwice,  // done twice, as by a network that repeats a request; the second answer counts
   kStall,           // FaultPlan::onStall is called, then it is done
 };
@@ -40,8 +40,8 @@ enum class Fault : std::uint8_t {
 class FaultPlan {
  public:
   // The `nth` call from now on (1 is the next) of that kind (nothing: of any) meets `fault`; `persists`: all later ones too.
-  // Calls whose outcome is never in doubt (all but Commit and ReserveIds) meet kIoError in place of an unknown outcome and
-  // are not delivered twice.
+  // Calls other than Commit report an unknown outcome as an input/output error: ids that were perhaps reserved are only lost.
+  // Calls that change nothing are not delivered twice.
   void Set(Fault fault, std::uint64_t nth, std::optional<EngineCall> call = std::nullopt, bool persists = false);
   void Clear() noexcept;
   // Whether a call has met the fault since it was set.

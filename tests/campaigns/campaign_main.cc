@@ -8,6 +8,7 @@
 #include <string_view>
 
 #include "tests/campaigns/kill_loop.h"
+#include "tests/campaigns/power_loss.h"
 
 namespace vemo::campaign {
 
@@ -54,12 +55,28 @@ Verdict KillLoop(Numbers& numbers) {
   return RunKillLoop(options);
 }
 
+Verdict PowerLoss(Numbers& numbers) {
+  PowerLossOptions options;
+  numbers.Take("seed", options.seed);
+  numbers.Take("images", options.images);
+  numbers.Take("keys", options.keys);
+  numbers.Take("commits", options.commits);
+  numbers.Take("sync", options.sync);
+  numbers.RequireAllTaken();
+  return RunPowerLoss(options);
+}
+
 const std::map<std::string_view, std::function<Verdict(Numbers&)>>& Campaigns() {
-  static const std::map<std::string_view, std::function<Verdict(Numbers&)>> campaigns{{"kill_loop", KillLoop}};
+  static const std::map<std::string_view, std::function<Verdict(Numbers&)>> campaigns{{"kill_loop", KillLoop},
+                                                                                      {"power_loss", PowerLoss}};
   return campaigns;
 }
 
 int Run(int argc, char** argv) {
+  if (argc == 6 && std::string_view(argv[1]) == "record") {  // a process that the power is cut from
+    WorkUnderRecorder({argv[2], std::stoull(argv[3]), std::stoull(argv[4]), std::stoull(argv[5])});
+    return 0;
+  }
   const auto campaign = argc > 1 ? Campaigns().find(argv[1]) : Campaigns().end();
   if (campaign == Campaigns().end()) {
     std::cerr << "usage: campaign NAME [--seed N] [--OPTION N]...; the names are";

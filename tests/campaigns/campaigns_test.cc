@@ -2,6 +2,7 @@
 #include <gtest/gtest.h>
 
 #include "tests/campaigns/kill_loop.h"
+#include "tests/campaigns/power_loss.h"
 #include "tests/support/seed.h"
 
 namespace vemo::campaign {
@@ -16,6 +17,20 @@ TEST(Campaigns, AKilledProcessLosesNoCommitThatItHasReportedAndLeavesNoneHalfDon
   const Verdict verdict = RunKillLoop({.seed = test::TestSeed(11), .kills = 40, .keys = 1'200});
   ExpectSound(verdict);
   EXPECT_GT(verdict.CountOf("commits"), 40u);
+}
+
+TEST(Campaigns, ALossOfPowerAtAnyPointLeavesWhatWasReportedAndNothingHalfDone) {
+  const Verdict verdict = RunPowerLoss({.seed = test::TestSeed(12), .images = 300, .keys = 150, .commits = 4});
+  ExpectSound(verdict);
+  EXPECT_GE(verdict.CountOf("images"), 300u);
+  EXPECT_GT(verdict.CountOf("second losses"), 0u);
+}
+
+TEST(Campaigns, ALossOfPowerIsFoundOutWhereNothingWasSynced) {
+  const Verdict verdict =
+      RunPowerLoss({.seed = test::TestSeed(12), .images = 300, .keys = 150, .commits = 4, .sync = false, .maxFaults = 1});
+  std::cout << verdict.Line() << std::endl;
+  EXPECT_FALSE(verdict.IsSound()) << "the campaign cannot fail";
 }
 
 }  // namespace

@@ -75,6 +75,12 @@ TEST_F(FaultyEngineTest, IdsThatAreReservedTwiceAreOnlyLost) {
   EXPECT_EQ(engine().ReserveIds(10), OID(21));
 }
 
+TEST_F(FaultyEngineTest, IdsWhoseAnswerIsLostAreAnErrorAndOnlyLost) {
+  plan.Set(Fault::kUnknownApplied, 1, EngineCall::kReserveIds);
+  EXPECT_THROW(engine().ReserveIds(10), InjectedFault);
+  EXPECT_EQ(engine().ReserveIds(10), OID(11));
+}
+
 TEST_F(FaultyEngineTest, AScanFailsInItsMidst) {
   BatchBuilder batch;
   engine().Commit(batch.Put(2, "two").Put(3, "three").At(1));
