@@ -121,7 +121,7 @@ std::vector<ReaderInfo> CSpace::Readers() {
   return readers;
 }
 
-void CSpace::WarnOfOldReaders() {
+void CSpace::WarnOfOldReaders() noexcept try {
   if (!m_options.readerWarningAge || !m_options.log) return;
   for (const ReaderInfo& reader : Readers()) {
     if (!reader.age || *reader.age <= *m_options.readerWarningAge) continue;
@@ -129,6 +129,8 @@ void CSpace::WarnOfOldReaders() {
                                 " has been open for " + std::to_string(reader.age->count()) +
                                 " ms; the space cannot use the room of later changes again until it ends or is refreshed");
   }
+} catch (...) {
+  return;
 }
 
 OID CSpace::NextId() {

@@ -74,7 +74,8 @@ class CSpace {
   void CheckFormat(bool create);
   OID NextId();
   void Log(LogLevel level, const std::string& message) const;
-  void WarnOfOldReaders();
+  // Says nothing of its own failures: it runs when a commit has been made, which must not be reported as failed.
+  void WarnOfOldReaders() noexcept;
 
   // Ends what the mark of an object outside a transaction, or of a snapshot, has left half-changed, and throws.
   [[noreturn]] void RefuseMark(ptr<const IPersistable> object);

@@ -7,6 +7,7 @@
 #include <string>
 #include <string_view>
 
+#include "tests/campaigns/fault_sweep.h"
 #include "tests/campaigns/kill_loop.h"
 #include "tests/campaigns/power_loss.h"
 
@@ -66,9 +67,23 @@ Verdict PowerLoss(Numbers& numbers) {
   return RunPowerLoss(options);
 }
 
+template <Verdict (&run)(const FaultSweepOptions&)>
+Verdict FaultSweep(Numbers& numbers) {
+  FaultSweepOptions options;
+  numbers.Take("seed", options.seed);
+  numbers.Take("stride", options.stride);
+  numbers.Take("all", options.allFaults);
+  numbers.RequireAllTaken();
+  return run(options);
+}
+
 const std::map<std::string_view, std::function<Verdict(Numbers&)>>& Campaigns() {
-  static const std::map<std::string_view, std::function<Verdict(Numbers&)>> campaigns{{"kill_loop", KillLoop},
-                                                                                      {"power_loss", PowerLoss}};
+  static const std::map<std::string_view, std::function<Verdict(Numbers&)>> campaigns{
+      {"kill_loop", KillLoop},
+      {"power_loss", PowerLoss},
+      {"engine_faults", FaultSweep<RunEngineFaults>},
+      {"allocation_failures", FaultSweep<RunAllocationFailures>},
+  };
   return campaigns;
 }
 

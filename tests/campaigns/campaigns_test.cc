@@ -1,6 +1,7 @@
 // A slice of each campaign. tests/campaigns/run runs them at any size.
 #include <gtest/gtest.h>
 
+#include "tests/campaigns/fault_sweep.h"
 #include "tests/campaigns/kill_loop.h"
 #include "tests/campaigns/power_loss.h"
 #include "tests/support/seed.h"
@@ -31,6 +32,18 @@ TEST(Campaigns, ALossOfPowerIsFoundOutWhereNothingWasSynced) {
       RunPowerLoss({.seed = test::TestSeed(12), .images = 300, .keys = 150, .commits = 4, .sync = false, .maxFaults = 1});
   std::cout << verdict.Line() << std::endl;
   EXPECT_FALSE(verdict.IsSound()) << "the campaign cannot fail";
+}
+
+TEST(Campaigns, AnEngineThatFailsAtAnyCallLosesNothingCommittedAndTheHandleGoesOn) {
+  const Verdict verdict = RunEngineFaults({.seed = test::TestSeed(13), .stride = 5, .allFaults = false});
+  ExpectSound(verdict);
+  EXPECT_GT(verdict.CountOf("faults injected"), 200u);
+}
+
+TEST(Campaigns, AnAllocationThatFailsAnywhereLosesNothingCommittedAndTheHandleGoesOn) {
+  const Verdict verdict = RunAllocationFailures({.seed = test::TestSeed(14), .stride = 97});
+  ExpectSound(verdict);
+  EXPECT_GT(verdict.CountOf("faults injected"), 200u);
 }
 
 }  // namespace

@@ -55,6 +55,22 @@ TEST_P(ReadersTest, ThatAreOldAreLoggedAtACommit) {
   EXPECT_NE(m_messages[0].find("101 ms"), std::string::npos) << m_messages[0];
 }
 
+TEST_P(ReadersTest, ACommitThatWasMadeIsNotReportedAsFailedWhenTheLogFails) {
+  SpaceOptions options{.create = true, .readerWarningAge = milliseconds(100)};
+  options.clock = [this] { return std::chrono::steady_clock::time_point(m_now); };
+  options.log = [this](LogLevel, const std::string& message) {
+    m_messages.push_back(message);
+    throw std::runtime_error("the log is full");
+  };
+  site.Close();
+  site.Open(options);
+  Snapshot snapshot(space());
+  m_now += milliseconds(101);
+  EXPECT_NO_THROW(CommitFilled<TombstonesMap>(space(), "t", 10));
+  EXPECT_EQ(m_messages.size(), 1u);
+  EXPECT_TRUE(Snapshot(space()).HasRoot("t"));
+}
+
 TEST_P(ReadersTest, ThatAreTooOldExpireAtTheirNextReadAndLiveAgainAfterARefresh) {
   CommitFilled<TombstonesMap>(space(), "t", 1000);
   OpenWith({.readerMaxAge = milliseconds(500)});
