@@ -10,6 +10,8 @@
 #include "tests/campaigns/fault_sweep.h"
 #include "tests/campaigns/kill_loop.h"
 #include "tests/campaigns/power_loss.h"
+#include "tests/campaigns/races.h"
+#include "tests/campaigns/soak.h"
 
 namespace vemo::campaign {
 
@@ -67,6 +69,27 @@ Verdict PowerLoss(Numbers& numbers) {
   return RunPowerLoss(options);
 }
 
+Verdict SoakSpace(Numbers& numbers) {
+  SoakOptions options;
+  numbers.Take("seed", options.seed);
+  numbers.Take("operations", options.operations);
+  numbers.Take("keys", options.keys);
+  numbers.Take("commit", options.operationsPerCommit);
+  numbers.RequireAllTaken();
+  return RunSoak(options);
+}
+
+Verdict Race(Numbers& numbers) {
+  RacesOptions options;
+  numbers.Take("seed", options.seed);
+  numbers.Take("commits", options.commits);
+  numbers.Take("reads", options.reads);
+  numbers.Take("readers", options.readers);
+  numbers.Take("keys", options.keys);
+  numbers.RequireAllTaken();
+  return RunRaces(options);
+}
+
 template <Verdict (&run)(const FaultSweepOptions&)>
 Verdict FaultSweep(Numbers& numbers) {
   FaultSweepOptions options;
@@ -83,6 +106,8 @@ const std::map<std::string_view, std::function<Verdict(Numbers&)>>& Campaigns() 
       {"power_loss", PowerLoss},
       {"engine_faults", FaultSweep<RunEngineFaults>},
       {"allocation_failures", FaultSweep<RunAllocationFailures>},
+      {"soak", SoakSpace},
+      {"races", Race},
   };
   return campaigns;
 }

@@ -4,6 +4,8 @@
 #include "tests/campaigns/fault_sweep.h"
 #include "tests/campaigns/kill_loop.h"
 #include "tests/campaigns/power_loss.h"
+#include "tests/campaigns/races.h"
+#include "tests/campaigns/soak.h"
 #include "tests/support/seed.h"
 
 namespace vemo::campaign {
@@ -44,6 +46,19 @@ TEST(Campaigns, AnAllocationThatFailsAnywhereLosesNothingCommittedAndTheHandleGo
   const Verdict verdict = RunAllocationFailures({.seed = test::TestSeed(14), .stride = 97});
   ExpectSound(verdict);
   EXPECT_GT(verdict.CountOf("faults injected"), 200u);
+}
+
+TEST(Campaigns, ASoakedMapStaysWhatItsModelIs) {
+  ExpectSound(RunSoak({.seed = test::TestSeed(15),
+                       .operations = 200'000,
+                       .keys = 8'000,
+                       .operationsPerCommit = 4'000,
+                       .judgeMemory = false,
+                       .print = false}));
+}
+
+TEST(Campaigns, ReadersBesideAWriterSeeWholeCommits) {
+  ExpectSound(RunRaces({.seed = test::TestSeed(16), .commits = 150, .reads = 40, .keys = 600}));
 }
 
 }  // namespace

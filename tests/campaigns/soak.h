@@ -1,0 +1,22 @@
+// Very many operations on a space beside a std::map that is told the same, with commits, reopenings, snapshots and deletions:
+// every answer is the model's, and memory stays flat.
+#pragma once
+
+#include <cstdint>
+
+#include "tests/campaigns/verdict.h"
+
+namespace vemo::campaign {
+
+struct SoakOptions {
+  std::uint64_t seed = 1;
+  std::uint64_t operations = 100'000'000;
+  std::uint64_t keys = 400'000;               // half of them are there at a time
+  std::uint64_t operationsPerCommit = 50'000;
+  bool judgeMemory = true;                    // false for runs that are too short to tell, or under a sanitizer
+  bool print = true;                          // memory at each twentieth of the way
+};
+
+Verdict RunSoak(const SoakOptions& options);
+
+}  // namespace vemo::campaign
