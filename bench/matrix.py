@@ -4,12 +4,12 @@ import subprocess
 from dataclasses import dataclass
 
 OURS = "vemo"
-PROGRAMS = ("map_bench", "store_bench")
+PROGRAMS = ("map_bench", "store_bench", "replay_bench")
 
 # The first line that fits a workload decides its sizes.
 SIZES = {
     "smoke": [
-        (r"replay\.", [2_000]),
+        (r"replay\.", [200]),
         (r".*", [1_000]),
     ],
     "quick": [
@@ -19,14 +19,16 @@ SIZES = {
         (r"map\.", []),
         (r"store\.clustered\.P1$", [100_000]),
         (r"store\.", []),
-        (r"replay\.", [1_000_000]),
+        (r"replay\.recording$", [259_778]),
+        (r"replay\.git$", [10_000]),
     ],
     "full": [
         (r"map\.(insert|find-hit|find-dependent|scan|erase|memory)\.clustered\.P1$", [100_000, 1_000_000, 10_000_000]),
         (r"map\.", [100_000, 1_000_000]),
         (r"store\.clustered\.P1$", [100_000, 1_000_000, 10_000_000]),
         (r"store\.", [1_000_000]),
-        (r"replay\.", [1_000_000]),
+        (r"replay\.recording$", [259_778]),
+        (r"replay\.git$", [10_000]),
     ],
 }
 ROUNDS = {"smoke": 1, "quick": 3, "full": 5}
@@ -63,7 +65,7 @@ def list_jobs(build, mode, wanted):
     """All jobs that report a row which `wanted`, a compiled expression, is found in; ours first, a row's peers together."""
     jobs = []
     for program in PROGRAMS:
-        listed = subprocess.run([f"{build}/bench/{program}", "--list"], check=True, capture_output=True, text=True)
+        listed = subprocess.run([f"{build}/bench/{program}", "--list"], check=True, stdout=subprocess.PIPE, text=True)
         for line in listed.stdout.splitlines():
             name, *rows = line.split()
             workload, _, peer = name.partition("/")

@@ -3,8 +3,8 @@
 #include <algorithm>
 #include <utility>
 
+#include "bench/common/own_process.h"
 #include "bench/stores/files.h"
-#include "bench/stores/own_process.h"
 
 namespace vemo::bench {
 

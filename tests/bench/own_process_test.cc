@@ -1,4 +1,4 @@
-#include "bench/stores/own_process.h"
+#include "bench/common/own_process.h"
 
 #include <gtest/gtest.h>
 

@@ -1,4 +1,4 @@
-#include "bench/stores/own_process.h"
+#include "bench/common/own_process.h"
 
 #include <fmt/core.h>
 #include <sys/wait.h>
