@@ -13,7 +13,7 @@ SIZES = {
         (r".*", [1_000]),
     ],
     "quick": [
-        (r"map\.(insert|find-hit|find-dependent|scan)\.clustered\.P1$", [100_000, 1_000_000]),
+        (r"map\.(insert|find-hit|scan)\.clustered\.P1$", [100_000, 1_000_000]),
         (r"map\..*\.clustered\.P1$", [100_000]),
         (r"map\.(insert|find-hit)\.(random\.P1|clustered\.P2)$", [100_000]),
         (r"map\.", []),
@@ -61,15 +61,16 @@ def split_payload(row):
     return (head, tail) if re.fullmatch(r"P\d", tail) else (row, "")
 
 
-def list_jobs(build, mode, wanted):
-    """All jobs that report a row which `wanted`, a compiled expression, is found in; ours first, a row's peers together."""
+def list_jobs(build, mode, wanted, sizes=None):
+    """All jobs that report a row which `wanted`, a compiled expression, is found in; ours first, a row's peers together. `sizes`
+    replaces those of the mode."""
     jobs = []
     for program in PROGRAMS:
         listed = subprocess.run([f"{build}/bench/{program}", "--list"], check=True, stdout=subprocess.PIPE, text=True)
         for line in listed.stdout.splitlines():
             name, *rows = line.split()
             workload, _, peer = name.partition("/")
-            for size in sizes_of(workload, mode):
+            for size in sizes or sizes_of(workload, mode):
                 if any(wanted.search(f"{row}/{size}/{peer}") for row in rows or [workload]):
                     jobs.append(Job(program, workload, size, peer, tuple(rows or [workload])))
     order = {}
