@@ -105,6 +105,7 @@ const std::map<std::string_view, std::function<Verdict(Numbers&)>>& Campaigns() 
       {"kill_loop", KillLoop},
       {"power_loss", PowerLoss},
       {"engine_faults", FaultSweep<RunEngineFaults>},
+      {"disk_faults", FaultSweep<RunDiskFaults>},
       {"allocation_failures", FaultSweep<RunAllocationFailures>},
       {"soak", SoakSpace},
       {"races", Race},

@@ -42,6 +42,12 @@ TEST(Campaigns, AnEngineThatFailsAtAnyCallLosesNothingCommittedAndTheHandleGoesO
   EXPECT_GT(verdict.CountOf("faults injected"), 200u);
 }
 
+TEST(Campaigns, ADiskThatFailsAtAnyWriteOrSyncLosesNothingCommittedAndTheHandleGoesOn) {
+  const Verdict verdict = RunDiskFaults({.seed = test::TestSeed(17), .stride = 3});
+  ExpectSound(verdict);
+  EXPECT_GT(verdict.CountOf("faults injected"), 50u);
+}
+
 TEST(Campaigns, AnAllocationThatFailsAnywhereLosesNothingCommittedAndTheHandleGoesOn) {
   const Verdict verdict = RunAllocationFailures({.seed = test::TestSeed(14), .stride = 97});
   ExpectSound(verdict);

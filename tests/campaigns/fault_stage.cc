@@ -14,7 +14,6 @@ void Stage::Open() {
     LmdbOptions options;
     options.path = m_folder->path() / "space";
     options.create = true;
-    options.syncEachCommit = false;  // the faults come from the engine around it, not from the disk
     m_engine.reset();                // left by an attempt to open that failed
     m_engine = OpenLmdbEngine(options);
   } else if (m_engine == nullptr) {

@@ -10,6 +10,7 @@
 #include "tests/campaigns/fault_scenarios.h"
 #include "tests/campaigns/space_content.h"
 #include "tests/support/failing_allocator.h"
+#include "tests/support/failing_disk.h"
 #include "tests/support/keys.h"
 #include "vxOperation/src/WorkingSet/CompOp/VectorOT.h"
 
@@ -161,6 +162,14 @@ Disturbance WithFault(Fault fault, std::uint64_t place, bool persists) {
   };
 }
 
+Disturbance WithFailingDisk(std::uint64_t place, bool staysBroken, bool writesAllTheSame) {
+  return [=](Stage&, const std::function<void()>& act) {
+    const test::FailingDisk failing(static_cast<int>(place), staysBroken, writesAllTheSame);
+    act();
+    return failing.HasFailed();
+  };
+}
+
 Disturbance WithoutAllocation(std::uint64_t place) {
   return [=](Stage&, const std::function<void()>& act) {
     const test::FailingAllocation failing(static_cast<std::int64_t>(place));
@@ -186,6 +195,21 @@ Verdict RunEngineFaults(const FaultSweepOptions& options) {
           const std::string what = "fault " + std::to_string(static_cast<int>(fault)) + (persists ? " from call" : " at call");
           sweep.Run(scenario, sort, what, [&](std::uint64_t place) { return WithFault(fault, place, persists); });
         }
+      }
+    }
+  }
+  return sweep.verdict();
+}
+
+Verdict RunDiskFaults(const FaultSweepOptions& options) {
+  Sweep sweep("disk_faults", options);
+  for (const Scenario& scenario : FaultScenarios()) {
+    for (const bool staysBroken : {false, true}) {
+      for (const bool writesAllTheSame : {false, true}) {
+        const std::string what = std::string("write or sync ") + (staysBroken ? "from " : "") + (writesAllTheSame ? "(answer lost) " : "");
+        sweep.Run(scenario, EngineSort::kLmdb, what, [&](std::uint64_t place) {
+          return WithFailingDisk(place, staysBroken, writesAllTheSame);
+        });
       }
     }
   }

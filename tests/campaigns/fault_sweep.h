@@ -1,4 +1,5 @@
-// Every scenario with one thing going wrong, at each place where it can: a call of the engine, or an allocation.
+// Every scenario with one thing going wrong, at each place where it can: a call of the engine, a write of the disk, or an
+// allocation.
 //
 // Whatever goes wrong, the space holds what was committed by those commits that have returned, and of one whose outcome nobody
 // knows all or nothing; the same handle goes on, sees that in memory as on disk, and commits; the checker finds nothing; all
@@ -18,6 +19,8 @@ struct FaultSweepOptions {
 };
 
 Verdict RunEngineFaults(const FaultSweepOptions& options);
+// Over LMDB: each write and each sync of the disk below it.
+Verdict RunDiskFaults(const FaultSweepOptions& options);
 // Needs a program that tests/support/failing_allocator.cc is linked into.
 Verdict RunAllocationFailures(const FaultSweepOptions& options);
 

@@ -1,7 +1,7 @@
 #include "tests/support/failing_disk.h"
 
+#include <dlfcn.h>
 #include <errno.h>
-#include <sys/syscall.h>
 #include <sys/types.h>
 #include <sys/uio.h>
 #include <unistd.h>
@@ -11,6 +11,7 @@ namespace {
 // Of the thread that tests; 0 means that none is to fail.
 thread_local int t_untilFailure = 0;
 thread_local bool t_staysBroken = false;
+thread_local bool t_writesAllTheSame = false;
 thread_local bool t_failed = false;
 
 bool Fails() noexcept {
@@ -21,8 +22,21 @@ bool Fails() noexcept {
   }
   if (t_failed && !t_staysBroken) return false;
   t_failed = true;
-  errno = EIO;
   return true;
+}
+
+// The function of that name behind this one: the system's, or that of a library which watches the disk.
+template <class Function>
+Function Next(const char* name) noexcept {
+  return reinterpret_cast<Function>(::dlsym(RTLD_NEXT, name));
+}
+
+template <class Result, class Call>
+Result FailOr(Call&& call) noexcept {
+  if (!Fails()) return call();
+  if (t_writesAllTheSame) call();
+  errno = EIO;
+  return -1;
 }
 
 }  // namespace
@@ -30,25 +44,30 @@ bool Fails() noexcept {
 extern "C" {
 
 ssize_t pwrite(int file, const void* data, size_t size, off_t offset) {
-  return Fails() ? -1 : ::syscall(SYS_pwrite64, file, data, size, offset);
+  static const auto next = Next<ssize_t (*)(int, const void*, size_t, off_t)>("pwrite");
+  return FailOr<ssize_t>([&] { return next(file, data, size, offset); });
 }
 ssize_t writev(int file, const iovec* parts, int count) {
-  return Fails() ? -1 : ::syscall(SYS_writev, file, parts, count);
+  static const auto next = Next<ssize_t (*)(int, const iovec*, int)>("writev");
+  return FailOr<ssize_t>([&] { return next(file, parts, count); });
 }
 int fdatasync(int file) {
-  return Fails() ? -1 : static_cast<int>(::syscall(SYS_fdatasync, file));
+  static const auto next = Next<int (*)(int)>("fdatasync");
+  return FailOr<int>([&] { return next(file); });
 }
 int fsync(int file) {
-  return Fails() ? -1 : static_cast<int>(::syscall(SYS_fsync, file));
+  static const auto next = Next<int (*)(int)>("fsync");
+  return FailOr<int>([&] { return next(file); });
 }
 
 }  // extern "C"
 
 namespace vemo::test {
 
-FailingDisk::FailingDisk(int nth, bool staysBroken) noexcept {
+FailingDisk::FailingDisk(int nth, bool staysBroken, bool writesAllTheSame) noexcept {
   t_failed = false;
   t_staysBroken = staysBroken;
+  t_writesAllTheSame = writesAllTheSame;
   t_untilFailure = nth;
 }
 FailingDisk::~FailingDisk() {

@@ -5,10 +5,11 @@
 namespace vemo::test {
 
 // While it lives, the `nth` write or sync of this thread (1 is the next one) fails with EIO, and where it is
-// to stay broken all after it. Nothing of what fails is written. One at a time.
+// to stay broken all after it. Nothing of what fails is written, or with `writesAllTheSame` all of it: a disk
+// that loses the answer. One at a time.
 class FailingDisk {
  public:
-  FailingDisk(int nth, bool staysBroken) noexcept;
+  FailingDisk(int nth, bool staysBroken, bool writesAllTheSame = false) noexcept;
   ~FailingDisk();
   FailingDisk(const FailingDisk&) = delete;
   FailingDisk& operator=(const FailingDisk&) = delete;
