@@ -44,7 +44,7 @@ constexpr const char* kNotMade = "not made";
 std::unique_ptr<CSpace> OpenAfterLoss(const std::string& uri, const Image& image) {
   try {
     return CSpace::Open(uri, {.create = true});
-  } catch (const IncompatibleSpace&) {
+  } catch (const StoreError&) {
     if (image.acknowledged) throw;
     return nullptr;
   }
