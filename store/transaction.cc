@@ -16,9 +16,6 @@ namespace {
 
 thread_local WriteTransaction* t_transaction = nullptr;
 
-// How many queued deletions a commit works off at most, so that no commit pays for a large map that was cleared before it.
-constexpr std::size_t kDeletionsPerCommit = 256;
-
 constexpr std::size_t kMaxNameBytes = 400;
 
 void CheckName(std::string_view what, std::string_view name) {
@@ -380,6 +377,22 @@ bool WriteTransaction::HasDirtyNodes() const noexcept {
   return std::any_of(m_dirty.begin(), m_dirty.end(), [](const auto& entry) { return !FindClass(entry.second.Table())->isMap; });
 }
 
+// --- Collection ---
+
+const EngineSnapshot& WriteTransaction::BaseState() const {
+  RequireOpen();
+  return m_space.m_writerView.State();
+}
+
+void WriteTransaction::DropUnreachable(OID oid) {
+  RequireOpen();
+  if (const ptr<IPersistable> resident = m_space.m_writerView.Find(oid); resident.m_self != nullptr) {
+    DeleteObject(resident);
+  } else {
+    m_droppedRecords.push_back(oid);
+  }
+}
+
 // --- Commit ---
 
 void WriteTransaction::Commit() {
@@ -394,11 +407,12 @@ void WriteTransaction::Commit() {
   CommitBatch& batch = builder.Batch();
   try {
     AddChanged(builder);
-    builder.SweepQueue(kDeletionsPerCommit);
+    builder.SweepQueue(m_queueSlice);
     for (const Deleted& deleted : m_deleted) {
       if (deleted.hasRecord) batch.removedRecords.push_back(deleted.oid);
     }
     for (const OID oid : m_queuedDeletions) batch.queuedDeletions.push_back(oid);
+    batch.removedRecords.insert(batch.removedRecords.end(), m_droppedRecords.begin(), m_droppedRecords.end());
     for (const auto& [name, value] : m_meta) {
       std::optional<Bytes> sealed;
       if (value) {

@@ -106,6 +106,14 @@ class WriteTransaction {
   void CheckReachable(ptr<const IPersistable> from, ptr<const IPersistable> to) const;
   void Poison() noexcept { m_poisoned = true; }
 
+  // Of collection's side (store/collect.h):
+  // The commit that the transaction began with.
+  const EngineSnapshot& BaseState() const;
+  // The commit removes the record of an object that nothing reaches, and the object itself where it is in memory.
+  void DropUnreachable(OID oid);
+  // How many entries of the queue of deletions the commit works off at most.
+  void SetQueueSlice(std::size_t limit) noexcept { m_queueSlice = limit; }
+
  private:
   struct Deleted {
     OID oid;
@@ -157,6 +165,9 @@ class WriteTransaction {
   std::vector<Deleted> m_deleted;                      // in memory until the transaction ends
   std::unordered_set<OID> m_deletedIds;
   std::vector<OID> m_queuedDeletions;                  // subtrees of which nothing is in memory
+  std::vector<OID> m_droppedRecords;                   // unreachable, and not in memory
+  // No commit shall pay for a large map that was cleared before it.
+  std::size_t m_queueSlice = 256;
   std::vector<RemovedRoot> m_removedRoots;
   std::vector<RenamedRoot> m_renamedRoots;
   std::map<std::string, std::optional<std::string>, std::less<>> m_meta;  // nothing: erased

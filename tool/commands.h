@@ -19,5 +19,6 @@ void AddDumpCommand(CLI::App& app, Command& chosen);
 void AddVerifyCommand(CLI::App& app, Command& chosen);
 void AddStatsCommand(CLI::App& app, Command& chosen);
 void AddBlameCommand(CLI::App& app, Command& chosen);
+void AddCollectCommand(CLI::App& app, Command& chosen);
 
 }  // namespace vemo::tool

@@ -52,6 +52,7 @@ int main(int argc, char** argv) {
   vemo::tool::AddVerifyCommand(app, chosen);
   vemo::tool::AddStatsCommand(app, chosen);
   vemo::tool::AddBlameCommand(app, chosen);
+  vemo::tool::AddCollectCommand(app, chosen);
   try {
     app.parse(argc, argv);
   } catch (const CLI::Success& asked) {
