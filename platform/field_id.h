@@ -14,10 +14,13 @@ struct FieldId {
   OID oid;    // the object
   Path path;  // the field inside it
 
-  friend bool operator==(const FieldId& a, const FieldId& b) noexcept { return a.oid == b.oid && a.path == b.path; }
-  friend bool operator<(const FieldId& a, const FieldId& b) noexcept {
-    return a.oid < b.oid || (a.oid == b.oid && a.path < b.path);
+  // -1, 0 or 1 as `a` is before, equal to or behind `b`: by object, then by path.
+  static int Compare(const FieldId& a, const FieldId& b) noexcept {
+    if (a.oid.m_value != b.oid.m_value) return a.oid.m_value < b.oid.m_value ? -1 : 1;
+    return Path::Compare(a.path, b.path);
   }
+  friend bool operator==(const FieldId& a, const FieldId& b) noexcept { return Compare(a, b) == 0; }
+  friend bool operator<(const FieldId& a, const FieldId& b) noexcept { return Compare(a, b) < 0; }
 };
 
 // The text form: the object id in decimal, a colon, the steps of the path with dots between them. Path {0, 3} of object

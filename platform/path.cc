@@ -1,5 +1,6 @@
 #include "platform/path.h"
 
+#include <algorithm>
 #include <utility>
 
 namespace vemo {
@@ -25,6 +26,7 @@ Path& Path::operator=(Path&& other) noexcept {
   } else {
     std::copy_n(other.m_inline, kInlineCapacity, m_inline);
   }
+  std::fill_n(other.m_inline, kInlineCapacity, 0);
   return *this;
 }
 
@@ -36,7 +38,20 @@ std::span<Path::Element> Path::Resize(std::uint32_t size) {
     m_capacity = size;
   }
   m_size = size;
+  if (!IsOnHeap()) std::fill(m_inline + size, m_inline + kInlineCapacity, 0);
   return {data(), m_size};
+}
+
+int Path::CompareElements(const Path& a, const Path& b) noexcept {
+  const auto x = a.elements(), y = b.elements();
+  if (std::ranges::equal(x, y)) return 0;
+  return std::ranges::lexicographical_compare(x, y) ? -1 : 1;
+}
+
+// The copy takes no more room than it needs.
+void Path::CopyFromHeap(const Path& other) {
+  m_size = 0;
+  std::ranges::copy(other.elements(), Resize(other.m_size).begin());
 }
 
 }  // namespace vemo

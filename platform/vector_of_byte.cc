@@ -1,49 +1,64 @@
 #include "platform/vector_of_byte.h"
 
+#include <algorithm>
 #include <cstring>
 #include <new>
-#include <utility>
+
+#include "platform/relocate.h"
 
 namespace vemo {
 
-VectorOfByte::~VectorOfByte() { ::operator delete(m_data); }
+void VectorOfByte::FreeHeap() noexcept { ::operator delete(m_heap.data); }
 
-void VectorOfByte::reserve(ssize_t capacity) {
-  if (capacity <= m_capacity) return;
+void VectorOfByte::MoveToHeap(ssize_t capacity) {
   auto* grown = static_cast<std::byte*>(::operator new(static_cast<std::size_t>(capacity)));
-  if (m_size > 0) std::memcpy(grown, m_data, static_cast<std::size_t>(m_size));
-  ::operator delete(m_data);
-  m_data = grown;
-  m_capacity = capacity;
+  const ssize_t bytes = size();
+  if (bytes > 0) std::memcpy(grown, data(), static_cast<std::size_t>(bytes));
+  if (m_onHeap) FreeHeap();
+  m_heap = {grown, bytes, capacity};
+  m_onHeap = true;
+}
+
+void VectorOfByte::reserve(ssize_t wanted) {
+  if (m_onHeap ? wanted > m_heap.capacity : wanted > kInlineBytes) {
+    MoveToHeap(std::max(wanted, capacity()));
+  } else if (!m_onHeap && wanted > m_inlineCapacity) {
+    m_inlineCapacity = static_cast<std::uint8_t>(wanted);
+  }
 }
 
 std::byte* VectorOfByte::insertbytes(ssize_t position, ssize_t count) {
-  reserve(m_size + count);
-  if (m_data == nullptr) return nullptr;
-  std::byte* gap = m_data + position;
-  std::memmove(gap + count, gap, static_cast<std::size_t>(m_size - position));
-  m_size += count;
+  const ssize_t old = size();
+  reserve(old + count);
+  if (capacity() == 0) return nullptr;
+  std::byte* gap = data() + position;
+  std::memmove(gap + count, gap, static_cast<std::size_t>(old - position));
+  SetSize(old + count);
   return gap;
 }
 
 std::byte* VectorOfByte::appendbytes(ssize_t count) {
-  if (m_capacity < m_size + count) reserve(m_size + count + m_capacity);
-  std::byte* end = m_data + m_size;
-  m_size += count;
-  return end;
+  const ssize_t old = size();
+  const ssize_t needed = old + count;
+  const ssize_t grown = capacity() < needed ? needed + capacity() : capacity();
+  if (m_onHeap || needed > kInlineBytes) {
+    reserve(grown);
+  } else {
+    m_inlineCapacity = static_cast<std::uint8_t>(grown);
+  }
+  SetSize(needed);
+  return data() + old;
 }
 
 void VectorOfByte::erasebytes(ssize_t position, ssize_t count) noexcept {
   if (count == 0) return;
-  std::byte* gap = m_data + position;
-  std::memmove(gap, gap + count, static_cast<std::size_t>(m_size - position - count));
-  m_size -= count;
+  std::byte* gap = data() + position;
+  std::memmove(gap, gap + count, static_cast<std::size_t>(size() - position - count));
+  SetSize(size() - count);
 }
 
 void VectorOfByte::swap(VectorOfByte& other) noexcept {
-  std::swap(m_data, other.m_data);
-  std::swap(m_size, other.m_size);
-  std::swap(m_capacity, other.m_capacity);
+  if (this != &other) memswap(this, &other, sizeof(*this));
 }
 
 }  // namespace vemo

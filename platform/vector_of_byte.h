@@ -2,32 +2,41 @@
 #pragma once
 
 #include <cstddef>
+#include <cstdint>
 
 #include "platform/types.h"
 
 namespace vemo {
 
-// The bytes are aligned for any scalar type and move when the capacity grows. The object itself may be relocated as raw
-// bytes: nothing in it points into it. Allocation failure throws std::bad_alloc and leaves the buffer as it was.
+// Up to kInlineBytes bytes lie in the object itself, more on the heap. The bytes are aligned to kAlignment and move when the
+// buffer grows and when it is relocated, which may be done as raw bytes: nothing in it points into it. The capacity follows
+// one rule of growth wherever the bytes lie, so it can be more than kInlineBytes before there is memory on the heap: reserve
+// makes sure of what it names. Allocation failure throws std::bad_alloc and leaves the buffer as it was.
 class VectorOfByte {
  public:
+  // Two intervals: most vectors have few runs of tombstones, and reading a record is then free of allocations.
+  static constexpr ssize_t kInlineBytes = 32;
+  static constexpr std::size_t kAlignment = 8;
+
   VectorOfByte() noexcept = default;
-  ~VectorOfByte();
+  ~VectorOfByte() {
+    if (m_onHeap) FreeHeap();
+  }
   VectorOfByte(const VectorOfByte&) = delete;
   VectorOfByte& operator=(const VectorOfByte&) = delete;
 
-  std::byte* data() noexcept { return m_data; }
-  const std::byte* data() const noexcept { return m_data; }
-  ssize_t size() const noexcept { return m_size; }
-  ssize_t capacity() const noexcept { return m_capacity; }
+  std::byte* data() noexcept { return m_onHeap ? m_heap.data : m_inline; }
+  const std::byte* data() const noexcept { return m_onHeap ? m_heap.data : m_inline; }
+  ssize_t size() const noexcept { return m_onHeap ? m_heap.size : m_inlineSize; }
+  ssize_t capacity() const noexcept { return m_onHeap ? m_heap.capacity : m_inlineCapacity; }
 
   // Sets the size to 0 and keeps the capacity.
-  void clear() noexcept { m_size = 0; }
+  void clear() noexcept { SetSize(0); }
 
-  // Makes the capacity `capacity` bytes where it is smaller.
+  // Makes the capacity `capacity` bytes where it is smaller; filling up to `capacity` bytes does not throw from then on.
   void reserve(ssize_t capacity);
 
-  // Opens a gap of `count` bytes at `position` (0..size()) and returns its start; null where nothing is stored. Needs
+  // Opens a gap of `count` bytes at `position` (0..size()) and returns its start; null in a buffer without capacity. Needs
   // no more than the exact capacity.
   std::byte* insertbytes(ssize_t position, ssize_t count);
 
@@ -42,9 +51,29 @@ class VectorOfByte {
   void swap(VectorOfByte& other) noexcept;
 
  private:
-  std::byte* m_data = nullptr;
-  ssize_t m_size = 0;
-  ssize_t m_capacity = 0;
+  struct Heap {
+    std::byte* data;
+    ssize_t size;
+    ssize_t capacity;
+  };
+
+  void SetSize(ssize_t size) noexcept {
+    if (m_onHeap) {
+      m_heap.size = size;
+    } else {
+      m_inlineSize = static_cast<std::uint8_t>(size);
+    }
+  }
+  void FreeHeap() noexcept;
+  void MoveToHeap(ssize_t capacity);
+
+  union {
+    alignas(kAlignment) std::byte m_inline[kInlineBytes];
+    Heap m_heap;
+  };
+  std::uint8_t m_inlineSize = 0;
+  std::uint8_t m_inlineCapacity = 0;  // at most 2 * kInlineBytes by the rule of growth
+  bool m_onHeap = false;
 };
 
 }  // namespace vemo

@@ -28,7 +28,7 @@ template <class T>
 class xvector {
  public:
   static_assert(std::is_trivially_copyable_v<T>, "elements are moved and dropped as raw bytes");
-  static_assert(alignof(T) <= alignof(std::max_align_t));
+  static_assert(alignof(T) <= VectorOfByte::kAlignment);
 
   using value_type = T;
 
@@ -72,7 +72,7 @@ class xvector {
   // before every insertion costs amortised constant time. What then fits does not throw.
   void ReserveMore(ssize_t count) {
     const ssize_t needed = m_buffer.size() + count * kElementBytes;
-    if (m_buffer.capacity() < needed) m_buffer.reserve(needed + m_buffer.capacity());
+    m_buffer.reserve(m_buffer.capacity() < needed ? needed + m_buffer.capacity() : needed);
   }
 
   // Appends a copy. A full buffer grows to the needed size plus its old capacity. `element` may lie in this

@@ -128,11 +128,15 @@ TEST(XVector, AssigningAVectorToItselfLeavesItUnchanged) {
 }
 
 TEST(XVector, MovingTakesTheBuffer) {
-  xvector<int> source = Vector({1, 2, 3});
+  xvector<int> source = Vector({1, 2, 3, 4, 5, 6, 7, 8, 9});
   const int* data = source.data();
   const xvector<int> target = std::move(source);
   EXPECT_EQ(target.data(), data);
   EXPECT_TRUE(source.empty());
+  xvector<int> small = Vector({1, 2});
+  const xvector<int> moved = std::move(small);
+  EXPECT_EQ(Elements(moved), (std::vector<int>{1, 2}));
+  EXPECT_TRUE(small.empty());
   xvector<int> assigned = Vector({4});
   assigned = Vector({5, 6});
   EXPECT_EQ(Elements(assigned), (std::vector<int>{5, 6}));
@@ -192,15 +196,30 @@ TEST(XVector, EqualityStopsAtTheFirstPairThatDiffers) {
   EXPECT_EQ(comparisons, 6);
 }
 
+// The capacity after three elements is more than lies in the vector itself; what it promises must be there all the same.
+TEST(XVector, WhatWasReservedFitsWithoutAllocation) {
+  for (const int filled : {0, 1, 2, 3, 7, 8, 9}) {
+    for (const ssize_t more : {1, 4, 6, 40}) {
+      xvector<int> vector;
+      for (int i = 0; i < filled; ++i) vector.push_back(i);
+      vector.ReserveMore(more);
+      const test::FailingAllocation fail(1);
+      for (ssize_t i = 0; i < more; ++i) vector.push_back(7);
+      EXPECT_EQ(vector.size(), filled + more);
+    }
+  }
+}
+
 TEST(XVector, AFailedAllocationThrowsAndLeaksNothing) {
   const auto before = test::LiveAllocations();
   {
-    xvector<int> vector = Vector({1, 2});
+    xvector<int> vector = Vector({1, 2, 3, 4, 5, 6, 7, 8});
     {
       const test::FailingAllocation fail(1);
-      EXPECT_THROW(vector.push_back(3), std::bad_alloc);
+      EXPECT_THROW(vector.push_back(9), std::bad_alloc);
     }
-    EXPECT_EQ(Elements(vector), (std::vector<int>{1, 2}));
+    EXPECT_EQ(Elements(vector), (std::vector<int>{1, 2, 3, 4, 5, 6, 7, 8}));
+    vector.push_back(9);
     {
       const test::FailingAllocation fail(1);
       EXPECT_THROW(xvector<int> copy(vector), std::bad_alloc);

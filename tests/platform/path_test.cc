@@ -2,6 +2,7 @@
 
 #include <gtest/gtest.h>
 
+#include <algorithm>
 #include <new>
 #include <numeric>
 #include <utility>
@@ -131,6 +132,50 @@ TEST(Path, FreesWhatItAllocated) {
     path = copy;
   }
   EXPECT_EQ(test::LiveAllocations(), before);
+}
+
+// All paths of up to six steps of 0, 1 and the largest number, some of them shrunk from the heap, against the definition.
+TEST(Path, OrdersAsTheSequencesOfItsSteps) {
+  std::vector<std::vector<Path::Element>> sequences{{}};
+  for (std::size_t i = 0; i < sequences.size() && sequences[i].size() < 6; ++i) {
+    for (const Path::Element step : {0u, 1u, ~0u}) {
+      if (sequences[i].size() >= 3 && step == 1) continue;
+      sequences.push_back(sequences[i]);
+      sequences.back().push_back(step);
+    }
+  }
+  std::vector<Path> paths;
+  for (const auto& sequence : sequences) {
+    paths.emplace_back(sequence);
+    if (sequence.size() % 2 == 0) continue;
+    paths.back() = PathOfLength(8, 5);
+    paths.back() = Path(sequence);
+    if (sequence.size() == 3) {
+      paths.back() = PathOfLength(7, 9);
+      std::ranges::copy(sequence, paths.back().Resize(3).begin());
+    }
+  }
+  for (std::size_t i = 0; i < paths.size(); ++i) {
+    for (std::size_t j = 0; j < paths.size(); ++j) {
+      const int expected = sequences[i] < sequences[j] ? -1 : sequences[i] == sequences[j] ? 0 : 1;
+      ASSERT_EQ(Path::Compare(paths[i], paths[j]), expected) << i << " " << j;
+      ASSERT_EQ(paths[i] < paths[j], expected < 0);
+      ASSERT_EQ(paths[i] == paths[j], expected == 0);
+    }
+  }
+}
+
+TEST(Path, StepsThatWereCutOffDoNotCount) {
+  Path path{1, 2, 3};
+  path.Resize(1);
+  EXPECT_EQ(path, Path{1});
+  path.Resize(2)[1] = 0;
+  EXPECT_EQ(path, (Path{1, 0}));
+  Path source{4, 5};
+  const Path taken = std::move(source);
+  source.Resize(1)[0] = 4;
+  EXPECT_EQ(source, Path{4});
+  EXPECT_EQ(taken, (Path{4, 5}));
 }
 
 }  // namespace

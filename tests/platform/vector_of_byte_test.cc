@@ -103,18 +103,64 @@ TEST(VectorOfByte, SwapExchangesContentsAndCapacities) {
 }
 
 TEST(VectorOfByte, AFailedAllocationLeavesTheBufferAsItWas) {
+  for (const std::string& text : {std::string(VectorOfByte::kInlineBytes, 'i'), std::string(50, 'h')}) {
+    VectorOfByte buffer;
+    Append(buffer, text);
+    {
+      const test::FailingAllocation fail(1);
+      EXPECT_THROW(buffer.appendbytes(1), std::bad_alloc);
+    }
+    {
+      const test::FailingAllocation fail(1);
+      EXPECT_THROW(buffer.insertbytes(1, 1), std::bad_alloc);
+    }
+    EXPECT_EQ(Contents(buffer), text);
+    EXPECT_EQ(buffer.capacity(), static_cast<ssize_t>(text.size()));
+  }
+}
+
+TEST(VectorOfByte, FewBytesNeedNoAllocation) {
+  const auto before = test::LiveAllocations();
   VectorOfByte buffer;
-  Append(buffer, "abc");
-  {
-    const test::FailingAllocation fail(1);
-    EXPECT_THROW(buffer.appendbytes(1), std::bad_alloc);
+  Append(buffer, std::string(VectorOfByte::kInlineBytes, 'x'));
+  EXPECT_EQ(test::LiveAllocations(), before);
+  Append(buffer, "y");
+  EXPECT_EQ(test::LiveAllocations(), before + 1);
+}
+
+TEST(VectorOfByte, BytesKeepTheirOrderAcrossTheWayToTheHeap) {
+  for (ssize_t piece = 1; piece <= 40; ++piece) {
+    VectorOfByte buffer;
+    std::string expected;
+    ssize_t capacity = 0;
+    for (char c = 'a'; c < 'a' + 20; ++c) {
+      const std::string text(static_cast<std::size_t>(piece), c);
+      Append(buffer, text);
+      expected += text;
+      const auto size = static_cast<ssize_t>(expected.size());
+      if (capacity < size) capacity += size;
+      EXPECT_EQ(buffer.capacity(), capacity);
+    }
+    EXPECT_EQ(Contents(buffer), expected);
+    buffer.erasebytes(1, buffer.size() - 2);
+    EXPECT_EQ(Contents(buffer), expected.substr(0, 1) + expected.back());
   }
-  {
-    const test::FailingAllocation fail(1);
-    EXPECT_THROW(buffer.insertbytes(1, 1), std::bad_alloc);
+}
+
+TEST(VectorOfByte, SwapsWhereverTheBytesLie) {
+  const std::string texts[] = {"", "short", std::string(100, 'l')};
+  for (const std::string& left : texts) {
+    for (const std::string& right : texts) {
+      VectorOfByte a, b;
+      Append(a, left);
+      Append(b, right);
+      a.swap(b);
+      EXPECT_EQ(Contents(a), right);
+      EXPECT_EQ(Contents(b), left);
+      a.swap(a);
+      EXPECT_EQ(Contents(a), right);
+    }
   }
-  EXPECT_EQ(Contents(buffer), "abc");
-  EXPECT_EQ(buffer.capacity(), 3);
 }
 
 TEST(VectorOfByte, FreesItsMemory) {
@@ -123,6 +169,7 @@ TEST(VectorOfByte, FreesItsMemory) {
     VectorOfByte buffer;
     buffer.appendbytes(10);
     buffer.appendbytes(1000);
+    buffer.appendbytes(10'000);
   }
   EXPECT_EQ(test::LiveAllocations(), before);
 }

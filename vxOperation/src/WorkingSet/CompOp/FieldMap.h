@@ -283,6 +283,8 @@ class TFieldMap : public PersistableMixin<IObjectBaseMixin<typename Traits::Map,
   std::vector<LoadedNode> LoadLevel(std::vector<LoadedNode>& children, ssize_t perNode);
   IteratorPolicy BoundPosition(LeafNode* leaf, ssize_t j) const;
 
+  void Append(const value_type& entry);
+  static void AssignPayload(wFindRet& ret, PayloadArgument<Payload>& argument);
   void MakeRootLeaf();
   void GrowRoot(InternalKeyEntry& splitEntry);
   static void PlaceNewEntry(LeafNode* leaf, ssize_t slot, PendingValue<FieldId>& key);

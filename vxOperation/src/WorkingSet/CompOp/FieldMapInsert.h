@@ -254,14 +254,17 @@ std::pair<typename TFieldMap<Traits>::iterator, bool> TFieldMap<Traits>::InsertA
   wFindRet ret;
   wFind(ret, key, true, &argument);
   VEMO_ASSERT(ret.m_leaf);
-  if (ret.m_created) {
-    VEMO_ASSERT(ret.m_payload);
-    argument.AssignTo(*ret.m_payload);
-    VEMO_ASSERT_TEXT(ret.m_containingNode.m_self != nullptr, "ret.m_containingNode");
-    MarkPersistentAsDirtyWithoutTrace(ret.m_containingNode);
-  }
+  if (ret.m_created) AssignPayload(ret, argument);
   scope.Complete();
   return {iterator(IteratorPolicy(ret.m_leaf, ret.m_index)), ret.m_created};
+}
+
+template <class Traits>
+void TFieldMap<Traits>::AssignPayload(wFindRet& ret, PayloadArgument<Payload>& argument) {
+  VEMO_ASSERT(ret.m_payload);
+  argument.AssignTo(*ret.m_payload);
+  VEMO_ASSERT_TEXT(ret.m_containingNode.m_self != nullptr, "ret.m_containingNode");
+  MarkPersistentAsDirtyWithoutTrace(ret.m_containingNode);
 }
 
 template <class Traits>
@@ -282,11 +285,7 @@ bool TFieldMap<Traits>::InsertArgument(const FieldId& key, PayloadArgument<Paylo
   wFindRet ret;
   wFind(ret, key, true, &argument);
   VEMO_ASSERT(ret.m_payload);
-  if (replace || ret.m_created) {
-    argument.AssignTo(*ret.m_payload);
-    VEMO_ASSERT_TEXT(ret.m_containingNode.m_self != nullptr, "ret.m_containingNode");
-    MarkPersistentAsDirtyWithoutTrace(ret.m_containingNode);
-  }
+  if (replace || ret.m_created) AssignPayload(ret, argument);
   scope.Complete();
   return ret.m_created;
 }

@@ -29,7 +29,7 @@ namespace vemo {
 struct ReflectedClass;
 
 // The order of the whole map: by object, then by path.
-inline int CompareKeys(const FieldId& a, const FieldId& b) noexcept { return a < b ? -1 : a == b ? 0 : 1; }
+inline int CompareKeys(const FieldId& a, const FieldId& b) noexcept { return FieldId::Compare(a, b); }
 
 // A separator key and the child to its right.
 struct FieldMapInternalKeyEntry {
