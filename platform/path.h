@@ -31,9 +31,14 @@ class Path {
       std::memcpy(m_inline, other.m_inline, sizeof(m_inline));
     }
   }
-  Path(Path&& other) noexcept;
+  Path(Path&& other) noexcept : Path() { Take(other); }
   Path& operator=(const Path& other);
-  Path& operator=(Path&& other) noexcept;
+  Path& operator=(Path&& other) noexcept {
+    if (this == &other) return *this;
+    if (IsOnHeap()) delete[] m_heap;
+    Take(other);
+    return *this;
+  }
   ~Path() {
     if (IsOnHeap()) delete[] m_heap;
   }
@@ -44,7 +49,14 @@ class Path {
 
   // Makes the path `size` elements long, for the caller to fill in; what it held stays where it does not grow beyond the
   // storage it has.
-  std::span<Element> Resize(std::uint32_t size);
+  std::span<Element> Resize(std::uint32_t size) {
+    if (size > m_capacity) Grow(size);
+    m_size = size;
+    if (!IsOnHeap()) {
+      for (std::uint32_t i = size; i < kInlineCapacity; ++i) m_inline[i] = 0;
+    }
+    return {data(), m_size};
+  }
 
   // -1, 0 or 1 as `a` is before, equal to or behind `b`.
   static int Compare(const Path& a, const Path& b) noexcept {
@@ -63,6 +75,16 @@ class Path {
   std::uint64_t InlinePair(std::uint32_t i) const noexcept {
     return std::uint64_t{m_inline[i]} << 32 | m_inline[i + 1];
   }
+  // Moves what `other` holds here, where nothing is held, and leaves it empty.
+  void Take(Path& other) noexcept {
+    m_size = other.m_size;
+    m_capacity = other.m_capacity;
+    std::memcpy(m_inline, other.m_inline, sizeof(m_inline));  // the steps, or the pointer to them
+    other.m_size = 0;
+    other.m_capacity = kInlineCapacity;
+    std::memset(other.m_inline, 0, sizeof(other.m_inline));
+  }
+  void Grow(std::uint32_t size);
   static int CompareElements(const Path& a, const Path& b) noexcept;
   void CopyFromHeap(const Path& other);
   bool IsOnHeap() const noexcept { return m_capacity > kInlineCapacity; }

@@ -4,11 +4,7 @@
 
 namespace vemo {
 
-std::size_t VariableLengthBytes(std::uint8_t first) noexcept {
-  return 1u + static_cast<std::size_t>(std::countl_one(first));
-}
-
-std::uint8_t* SerialiseVariableLengthUint64(std::uint8_t* p, std::uint64_t value) noexcept {
+std::uint8_t* SerialiseLongVariableLengthUint64(std::uint8_t* p, std::uint64_t value) noexcept {
   const auto bits = static_cast<unsigned>(std::bit_width(value));
   const unsigned following = bits > 56 ? 8 : bits <= 7 ? 0 : (bits - 1) / 7;
   const unsigned prefix = 0xFF00u >> following & 0xFFu;
@@ -18,7 +14,7 @@ std::uint8_t* SerialiseVariableLengthUint64(std::uint8_t* p, std::uint64_t value
   return p;
 }
 
-const std::uint8_t* DeserialiseVariableLengthUint64(const std::uint8_t* p, std::uint64_t& value) noexcept {
+const std::uint8_t* DeserialiseLongVariableLengthUint64(const std::uint8_t* p, std::uint64_t& value) noexcept {
   const std::size_t following = VariableLengthBytes(*p) - 1;
   std::uint64_t x = following >= 7 ? 0 : *p & (0x7Fu >> following);
   for (std::size_t i = 1; i <= following; ++i) x = x << 8 | p[i];

@@ -14,6 +14,7 @@
 // Writers use the shortest form.
 #pragma once
 
+#include <bit>
 #include <cstddef>
 #include <cstdint>
 
@@ -72,11 +73,26 @@ inline const std::uint8_t* DeserialiseVariableLengthUint32(const std::uint8_t* p
   return p + 5;
 }
 
+// What a value above 32 bits, or a form of five bytes and more, needs.
+std::uint8_t* SerialiseLongVariableLengthUint64(std::uint8_t* p, std::uint64_t value) noexcept;
+const std::uint8_t* DeserialiseLongVariableLengthUint64(const std::uint8_t* p, std::uint64_t& value) noexcept;
+
 // The same form for 64-bit values: 1 to 9 bytes.
-std::uint8_t* SerialiseVariableLengthUint64(std::uint8_t* p, std::uint64_t value) noexcept;
-const std::uint8_t* DeserialiseVariableLengthUint64(const std::uint8_t* p, std::uint64_t& value) noexcept;
+inline std::uint8_t* SerialiseVariableLengthUint64(std::uint8_t* p, std::uint64_t value) noexcept {
+  if (value <= 0xFFFFFFFFu) return SerialiseVariableLengthUint32(p, static_cast<std::uint32_t>(value));
+  return SerialiseLongVariableLengthUint64(p, value);
+}
+inline const std::uint8_t* DeserialiseVariableLengthUint64(const std::uint8_t* p, std::uint64_t& value) noexcept {
+  if (*p >= 0xF0u) return DeserialiseLongVariableLengthUint64(p, value);
+  std::uint32_t low = 0;
+  p = DeserialiseVariableLengthUint32(p, low);
+  value = low;
+  return p;
+}
 
 // The length in bytes of the form whose first byte is `first`: 1 to 9.
-std::size_t VariableLengthBytes(std::uint8_t first) noexcept;
+inline std::size_t VariableLengthBytes(std::uint8_t first) noexcept {
+  return 1u + static_cast<std::size_t>(std::countl_one(first));
+}
 
 }  // namespace vemo

@@ -18,7 +18,7 @@ class VectorOfByte {
   static constexpr ssize_t kInlineBytes = 32;
   static constexpr std::size_t kAlignment = 8;
 
-  VectorOfByte() noexcept = default;
+  VectorOfByte() noexcept : m_inline{} {}
   ~VectorOfByte() {
     if (m_onHeap) FreeHeap();
   }

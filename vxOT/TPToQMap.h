@@ -193,8 +193,20 @@ void TPtoQMap<T>::ReplaceRuns(ssize_t first, ssize_t count, const Interval& merg
 
 template <class T>
 void TPtoQMap<T>::Serialise(Archive& ar) const {
-  SerialiseVariableLengthUint(ar, m_tombstones.size());
+  const auto n = static_cast<std::size_t>(m_tombstones.size());
   T t = 0;
+  if (std::uint8_t* p = ar.BeginWriteIfRoom((1 + 2 * n) * MAX_VARIABLE_LENGTH_UINT_SIZE)) {
+    p = SerialiseVariableLengthInteger(p, n);
+    for (const Interval* i = begin(); i != end(); ++i) {
+      VEMO_ASSERT(t <= i->t1);
+      p = SerialiseVariableLengthInteger(p, i->t1 - t);
+      p = SerialiseVariableLengthInteger(p, i->size());
+      t = i->t2;
+    }
+    ar.EndWrite(p);
+    return;
+  }
+  SerialiseVariableLengthUint(ar, n);
   for (const Interval* i = begin(); i != end(); ++i) {
     VEMO_ASSERT(t <= i->t1);
     SerialiseVariableLengthUint(ar, i->t1 - t);

@@ -31,6 +31,14 @@ void Serialise(Archive& ar, const OID& oid) {
 void Deserialise(InputArchive& ar, OID& oid) { ar.SetPtr(DeserialiseVariableLengthUint64(ar.ptr(), oid.m_value)); }
 
 void Serialise(Archive& ar, const FieldId& field) {
+  const std::size_t mostBytes = kMaxVariableLengthUint64Bytes + (1 + std::size_t{field.path.size()}) * MAX_VARIABLE_LENGTH_UINT_SIZE;
+  if (std::uint8_t* p = ar.BeginWriteIfRoom(mostBytes)) {
+    p = SerialiseVariableLengthUint64(p, field.oid.m_value);
+    p = SerialiseVariableLengthUint32(p, field.path.size());
+    for (const Path::Element element : field.path.elements()) p = SerialiseVariableLengthUint32(p, element);
+    ar.EndWrite(p);
+    return;
+  }
   Serialise(ar, field.oid);
   SerialiseVariableLengthUint(ar, ssize_t{field.path.size()});
   for (const Path::Element element : field.path.elements()) SerialiseVariableLengthUint(ar, ssize_t{element});

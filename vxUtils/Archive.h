@@ -47,6 +47,12 @@ class Archive {
     m_pos = pos;
   }
 
+  // As BeginWrite, where that would not have to make room; else null. For several items at once.
+  std::uint8_t* BeginWriteIfRoom(std::size_t reserveSize) {
+    AssertPosInBuffer();
+    return reserveSize <= static_cast<std::size_t>(m_writeBuffer + ARCHIVE_BUFSIZE - m_pos) ? m_pos : nullptr;
+  }
+
   // Writes the bytes of a plain value as they lie in memory.
   template <class T>
   void SerialisePod(const T& value) {

@@ -7,22 +7,22 @@
 
 namespace vemo {
 
-std::uint64_t BoundedReader::ReadUint64() {
+std::uint64_t BoundedReader::ReadLongUint64() {
   if (remaining() == 0) Fail("the bytes end where a number should begin");
   const std::uint8_t* p = m_bytes.data() + m_offset;
   const std::size_t length = VariableLengthBytes(*p);
   if (length > remaining()) Fail("the bytes end inside a number");
   std::uint64_t value = 0;
   DeserialiseVariableLengthUint64(p, value);
-  std::uint8_t shortest[kMaxVariableLengthUint64Bytes];
-  if (SerialiseVariableLengthUint64(shortest, value) != shortest + length) Fail("a number is not in its shortest form");
+  // A form one byte shorter holds 7 bits less.
+  if (length > 1 && value >> (7 * (length - 1)) == 0) Fail("a number is not in its shortest form");
   m_offset += length;
   return value;
 }
 
-std::uint32_t BoundedReader::ReadUint32() {
+std::uint32_t BoundedReader::ReadLongUint32() {
   const std::size_t start = m_offset;
-  const std::uint64_t value = ReadUint64();
+  const std::uint64_t value = ReadLongUint64();
   if (value > std::numeric_limits<std::uint32_t>::max()) {
     m_offset = start;
     Fail("a number has more than 32 bits");
@@ -30,14 +30,9 @@ std::uint32_t BoundedReader::ReadUint32() {
   return static_cast<std::uint32_t>(value);
 }
 
-std::uint32_t BoundedReader::ReadCount(std::size_t minBytesEach) {
-  const std::size_t start = m_offset;
-  const std::uint32_t count = ReadUint32();
-  if (count > remaining() / minBytesEach) {
-    m_offset = start;
-    Fail("the count " + std::to_string(count) + " is more than the bytes can hold");
-  }
-  return count;
+void BoundedReader::FailCount(std::size_t start, std::uint32_t count) {
+  m_offset = start;
+  Fail("the count " + std::to_string(count) + " is more than the bytes can hold");
 }
 
 void BoundedReader::ReadSchema(std::uint32_t currentSchema) {

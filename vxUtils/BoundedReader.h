@@ -23,11 +23,22 @@ class BoundedReader {
   std::size_t remaining() const noexcept { return m_bytes.size() - m_offset; }
 
   // Variable-length values; a form that is longer than its value needs is refused.
-  std::uint32_t ReadUint32();
-  std::uint64_t ReadUint64();
+  std::uint32_t ReadUint32() {
+    if (IsShort()) return m_bytes[m_offset++];
+    return ReadLongUint32();
+  }
+  std::uint64_t ReadUint64() {
+    if (IsShort()) return m_bytes[m_offset++];
+    return ReadLongUint64();
+  }
 
   // A count of items that take at least `minBytesEach` bytes each.
-  std::uint32_t ReadCount(std::size_t minBytesEach);
+  std::uint32_t ReadCount(std::size_t minBytesEach) {
+    const std::size_t start = m_offset;
+    const std::uint32_t count = ReadUint32();
+    if (count > remaining() / minBytesEach) [[unlikely]] FailCount(start, count);
+    return count;
+  }
 
   void ReadSchema(std::uint32_t currentSchema);
   Guid ReadGuid();
@@ -37,6 +48,11 @@ class BoundedReader {
   [[noreturn]] void Fail(const std::string& reason) const { throw MalformedBytes(m_offset, reason); }
 
  private:
+  bool IsShort() const noexcept { return m_offset < m_bytes.size() && m_bytes[m_offset] < 0x80; }
+  std::uint32_t ReadLongUint32();
+  std::uint64_t ReadLongUint64();
+  [[noreturn]] void FailCount(std::size_t start, std::uint32_t count);
+
   std::span<const std::uint8_t> m_bytes;
   std::size_t m_offset = 0;
 };
