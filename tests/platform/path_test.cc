@@ -24,8 +24,8 @@ std::vector<Path::Element> Elements(const Path& path) {
   return {path.elements().begin(), path.elements().end()};
 }
 
-// 4 steps lie inside the object, 5 do not.
-const std::uint32_t kLengths[] = {0, 1, 4, 5, 40};
+// 3 steps lie inside the object, 4 do not.
+const std::uint32_t kLengths[] = {0, 1, 3, 4, 5, 40};
 
 TEST(Path, DefaultIsEmpty) {
   const Path path;
@@ -161,6 +161,16 @@ TEST(Path, OrdersAsTheSequencesOfItsSteps) {
       ASSERT_EQ(Path::Compare(paths[i], paths[j]), expected) << i << " " << j;
       ASSERT_EQ(paths[i] < paths[j], expected < 0);
       ASSERT_EQ(paths[i] == paths[j], expected == 0);
+    }
+  }
+}
+
+TEST(Path, ResizingKeepsTheStepsThatFit) {
+  for (const std::uint32_t from : kLengths) {
+    for (const std::uint32_t to : kLengths) {
+      Path path = PathOfLength(from, 7);
+      path.Resize(to);
+      for (std::uint32_t i = 0; i < std::min(from, to); ++i) EXPECT_EQ(path.elements()[i], 7 + i) << from << " to " << to;
     }
   }
 }
