@@ -13,6 +13,10 @@ import matrix
 import report
 
 
+# What --quick promises.
+QUICK_SECONDS = 300
+
+
 def parse_arguments():
     parser = argparse.ArgumentParser(prog="bench/run", description="Measures vemo beside its peers.")
     parser.add_argument("--build", default="build", help=argparse.SUPPRESS)
@@ -23,7 +27,9 @@ def parse_arguments():
                         help="only rows WORKLOAD/SIZE/PEER in which this is found")
     parser.add_argument("--rounds", type=int, metavar="N", help="runs of each row (default 5; 3 with --quick)")
     parser.add_argument("--json", metavar="FILE", help="write the results there as JSON")
-    parser.add_argument("--markdown", metavar="FILE", help="write the table there as well as to the terminal")
+    parser.add_argument("--markdown", metavar="FILE",
+                        help="write the table there as well as to the terminal; in a file that has the two marks of "
+                             "docs/benchmarks.md, between these")
     parser.add_argument("--plots", metavar="FOLDER", help="write SVG plots there")
     parser.add_argument("--scratch", metavar="FOLDER", help="where stores are made (default: the build folder)")
     arguments = parser.parse_args()
@@ -82,7 +88,13 @@ def main():
     start = time.monotonic()
     samples = {}
     failed = set()
+    done = 0
     for turn in range(rounds):
+        elapsed = time.monotonic() - start
+        if arguments.quick and turn > 0 and elapsed * (turn + 1) / turn > QUICK_SECONDS:
+            print(f"Only {turn} rounds: another would take longer than {QUICK_SECONDS} s in all.", file=sys.stderr)
+            break
+        done = turn + 1
         for number, job in enumerate(jobs):
             if job in failed:
                 continue
@@ -100,11 +112,11 @@ def main():
         print("\r\x1b[K", end="", file=sys.stderr)
 
     results = report.summarise(samples)
-    text = report.markdown(results, rounds, time.monotonic() - start)
+    command = " ".join(["bench/run", *sys.argv[1:]]).replace(f" --build {arguments.build}", "")
+    text = report.markdown(results, command, done, time.monotonic() - start)
     print(text)
     if arguments.markdown:
-        with open(arguments.markdown, "w") as file:
-            file.write(text + "\n")
+        report.write_markdown(arguments.markdown, text)
     if arguments.json:
         with open(arguments.json, "w") as file:
             json.dump(results, file, indent=1)

@@ -1,6 +1,8 @@
 """Which rows are measured at which sizes, and how a row of output is named."""
+import os
 import re
 import subprocess
+import sys
 from dataclasses import dataclass
 
 OURS = "vemo"
@@ -66,6 +68,9 @@ def list_jobs(build, mode, wanted, sizes=None):
     replaces those of the mode."""
     jobs = []
     for program in PROGRAMS:
+        if not os.path.exists(f"{build}/bench/{program}"):
+            print(f"{program} was not built: its rows are skipped", file=sys.stderr)
+            continue
         listed = subprocess.run([f"{build}/bench/{program}", "--list"], check=True, stdout=subprocess.PIPE, text=True)
         for line in listed.stdout.splitlines():
             name, *rows = line.split()

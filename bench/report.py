@@ -1,11 +1,14 @@
 """From samples to medians, a table and a list of results. Lower is better in every row."""
 import datetime
+import os
 import statistics
 import subprocess
 
 import matrix
 
 FLOOR = "append+fdatasync"
+BEGIN = "<!-- results -->"
+END = "<!-- end of results -->"
 
 
 def summarise(samples):
@@ -75,10 +78,22 @@ def revision():
     return found.stdout.strip() or "unknown"
 
 
-def markdown(results, rounds, seconds):
+def write_markdown(path, text):
+    """Between the marks of a file that has them, else as the whole file."""
+    old = ""
+    if os.path.exists(path):
+        with open(path) as file:
+            old = file.read()
+    before, begin, rest = old.partition(BEGIN)
+    _, end, after = rest.partition(END)
+    with open(path, "w") as file:
+        file.write(f"{before}{begin}\n\n{text}\n\n{end}{after}" if begin and end else text + "\n")
+
+
+def markdown(results, command, rounds, seconds):
     """A table for each group of rows that the same peers took part in."""
-    lines = [f"{datetime.date.today()}, {processor()}, revision {revision()}; {rounds} rounds in {seconds:,.0f} s. "
-             "Median (least to most); the ratio is ours to the best peer, below 1 where vemo is better."]
+    lines = [f"`{command}`, {datetime.date.today()}, {processor()}, revision {revision()}; {rounds} rounds in "
+             f"{seconds:,.0f} s. Median (least to most); the ratio is ours to the best peer, below 1 where vemo is better."]
     header = None
     for key, row in by_row(results).items():
         group = key[0].split(".")[0]
