@@ -3,6 +3,7 @@ import argparse
 import json
 import os
 import re
+import shlex
 import shutil
 import subprocess
 import sys
@@ -112,7 +113,7 @@ def main():
         print("\r\x1b[K", end="", file=sys.stderr)
 
     results = report.summarise(samples)
-    command = " ".join(["bench/run", *sys.argv[1:]]).replace(f" --build {arguments.build}", "")
+    command = shlex.join(["bench/run", *sys.argv[1:]]).replace(f" --build {shlex.quote(arguments.build)}", "")
     text = report.markdown(results, command, done, time.monotonic() - start)
     print(text)
     if arguments.markdown:
