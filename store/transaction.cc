@@ -151,6 +151,21 @@ void* WriteTransaction::MakeOwnedRoot(const IPersistable::FnTable* table) {
   return m_space.m_writerView.AddRoot(OwnedRootName(oid), MapClass(table), oid).map.m_self;
 }
 
+void WriteTransaction::ReserveIdsUpTo(OID last) {
+  RequireOpen();
+  const OID first = m_space.m_engine->ReserveIds(1);
+  if (first < last || first == last) m_space.m_engine->ReserveIds(last.m_value - first.m_value + 1);
+  m_space.m_nextId = m_space.m_idLimit;  // the range that is open lies below
+}
+
+void* WriteTransaction::RestoreOwnedRoot(OID oid, const IPersistable::FnTable* table) {
+  RequireOpen();
+  if (FindAnyRoot(OwnedRootName(oid)) != nullptr || m_space.m_writerView.State().Read(oid)) {
+    throw UsageError(m_space.m_writerView.Describe(oid, "", "the space has an object of that id already"));
+  }
+  return m_space.m_writerView.AddRoot(OwnedRootName(oid), MapClass(table), oid).map.m_self;
+}
+
 OID WriteTransaction::RequireOwnedRoot(ptr<const IPersistable> map) {
   RequireOpen();
   RequireOwn(map);

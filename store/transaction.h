@@ -114,6 +114,14 @@ class WriteTransaction {
   // How many entries of the queue of deletions the commit works off at most.
   void SetQueueSlice(std::size_t limit) noexcept { m_queueSlice = limit; }
 
+  // Of salvage's side (store/salvage.h): ids given out from now on are higher than `last`, and an owned map is made that has
+  // the id which it had in another space. Throws UsageError when there is an object of that id.
+  void ReserveIdsUpTo(OID last);
+  template <class Map>
+  Map& RestoreOwned(OID oid) {
+    return *static_cast<Map*>(RestoreOwnedRoot(oid, IPersistable::Stubs<Map>::GetTable()));
+  }
+
  private:
   struct Deleted {
     OID oid;
@@ -134,6 +142,7 @@ class WriteTransaction {
   void* FindOrMakeRoot(std::string_view name, const IPersistable::FnTable* table);
   void* FindExistingRoot(std::string_view name, const IPersistable::FnTable* table);
   void* MakeOwnedRoot(const IPersistable::FnTable* table);
+  void* RestoreOwnedRoot(OID oid, const IPersistable::FnTable* table);
   OID RequireOwnedRoot(ptr<const IPersistable> map);
   void DeleteRootObject(const std::string& name);
   vemo::View::Root* FindRootOfClass(std::string_view name, const ClassEntry& classEntry);

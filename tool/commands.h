@@ -20,5 +20,6 @@ void AddVerifyCommand(CLI::App& app, Command& chosen);
 void AddStatsCommand(CLI::App& app, Command& chosen);
 void AddBlameCommand(CLI::App& app, Command& chosen);
 void AddCollectCommand(CLI::App& app, Command& chosen);
+void AddSalvageCommand(CLI::App& app, Command& chosen);
 
 }  // namespace vemo::tool

@@ -53,6 +53,7 @@ int main(int argc, char** argv) {
   vemo::tool::AddStatsCommand(app, chosen);
   vemo::tool::AddBlameCommand(app, chosen);
   vemo::tool::AddCollectCommand(app, chosen);
+  vemo::tool::AddSalvageCommand(app, chosen);
   try {
     app.parse(argc, argv);
   } catch (const CLI::Success& asked) {

@@ -5,6 +5,8 @@
 
 #include "history/source_error.h"
 #include "history/verify_history.h"
+#include "store/raw_check.h"
+#include "store/reading_engine.h"
 #include "store/verify.h"
 #include "tool/commands.h"
 #include "tool/numbers.h"
@@ -42,6 +44,21 @@ ExitCode RunVerify(const std::string& store) {
   return findings == 0 ? kGood : kFinding;
 }
 
+ExitCode RunRawVerify(const std::string& store) {
+  const auto engine = OpenEngineForReading(store);
+  const auto state = engine->OpenSnapshot();
+  RawCheckReport report;
+  {
+    ProgressBar bar("verifying", engine->Usage().records);
+    report = CheckRawSpace(*state, [&bar](std::uint64_t done) { bar.Update(done); });
+  }
+  for (const RawFinding& finding : report.findings) fmt::print("{}\n", OneLine(RawFindingText(finding)));
+  fmt::print("{} maps, {} entries, {} nodes, {} records, {} unreachable: {}\n", Grouped(report.maps),
+             Grouped(report.entries), Grouped(report.nodes), Grouped(report.records), Grouped(report.unreachable),
+             report.findings.empty() ? "sound" : fmt::format("{} findings", report.findings.size()));
+  return report.findings.empty() ? kGood : kFinding;
+}
+
 }  // namespace
 
 void AddVerifyCommand(CLI::App& app, Command& chosen) {
@@ -49,8 +66,12 @@ void AddVerifyCommand(CLI::App& app, Command& chosen) {
   CLI::App* command =
       app.add_subcommand("verify", "Check checksums, every map's structure and that the maps agree with one another");
   command->add_option("store", *store, "The space: lmdb:PATH")->required();
+  auto raw = std::make_shared<bool>(false);
+  command->add_flag("--raw", *raw, "Check the stored bytes with a reader of their own, also where the space cannot be opened");
   command->footer("Example:\n  vemo verify lmdb:/tmp/history");
-  command->callback([store, &chosen] { chosen = [store] { return RunVerify(*store); }; });
+  command->callback([store, raw, &chosen] {
+    chosen = [store, raw] { return *raw ? RunRawVerify(*store) : RunVerify(*store); };
+  });
 }
 
 }  // namespace vemo::tool

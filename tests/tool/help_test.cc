@@ -10,13 +10,13 @@ TEST_F(HelpTest, OfTheCommandNamesTheSubcommandsTheExitStatusAndAnExample) {
   EXPECT_EQ(outcome.exitCode, 0);
   EXPECT_EQ(outcome.err, "");
   for (const char* word :
-       {"replay", "dump", "verify", "stats", "blame", "collect", "Exit status: 0", "\nTry: vemo replay "}) {
+       {"replay", "dump", "verify", "stats", "blame", "collect", "salvage", "Exit status: 0", "\nTry: vemo replay "}) {
     EXPECT_NE(outcome.out.find(word), std::string::npos) << word;
   }
 }
 
 TEST_F(HelpTest, OfEachSubcommandHasAnExampleThatBeginsWithIt) {
-  for (const std::string command : {"replay", "dump", "verify", "stats", "blame", "collect"}) {
+  for (const std::string command : {"replay", "dump", "verify", "stats", "blame", "collect", "salvage"}) {
     const Outcome outcome = Vemo({command, "--help"});
     EXPECT_EQ(outcome.exitCode, 0) << command;
     EXPECT_EQ(outcome.err, "") << command;
