@@ -7,6 +7,7 @@
 #include <string>
 #include <string_view>
 
+#include "tests/campaigns/damage.h"
 #include "tests/campaigns/fault_sweep.h"
 #include "tests/campaigns/kill_loop.h"
 #include "tests/campaigns/power_loss.h"
@@ -69,6 +70,16 @@ Verdict PowerLoss(Numbers& numbers) {
   return RunPowerLoss(options);
 }
 
+Verdict DamageSpace(Numbers& numbers) {
+  DamageOptions options;
+  numbers.Take("seed", options.seed);
+  numbers.Take("damages", options.damages);
+  numbers.Take("forgeries", options.forgeries);
+  numbers.Take("salvage-every", options.salvageEvery);
+  numbers.RequireAllTaken();
+  return RunDamage(options);
+}
+
 Verdict SoakSpace(Numbers& numbers) {
   SoakOptions options;
   numbers.Take("seed", options.seed);
@@ -109,6 +120,7 @@ const std::map<std::string_view, std::function<Verdict(Numbers&)>>& Campaigns() 
       {"allocation_failures", FaultSweep<RunAllocationFailures>},
       {"soak", SoakSpace},
       {"races", Race},
+      {"damage", DamageSpace},
   };
   return campaigns;
 }

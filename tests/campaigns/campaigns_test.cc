@@ -1,6 +1,7 @@
 // A slice of each campaign. tests/campaigns/run runs them at any size.
 #include <gtest/gtest.h>
 
+#include "tests/campaigns/damage.h"
 #include "tests/campaigns/fault_sweep.h"
 #include "tests/campaigns/kill_loop.h"
 #include "tests/campaigns/power_loss.h"
@@ -65,6 +66,14 @@ TEST(Campaigns, ASoakedMapStaysWhatItsModelIs) {
 
 TEST(Campaigns, ReadersBesideAWriterSeeWholeCommits) {
   ExpectSound(RunRaces({.seed = test::TestSeed(16), .commits = 150, .reads = 40, .keys = 600}));
+}
+
+TEST(Campaigns, EveryDamageIsFoundByBothChecksAndCostsNothingElse) {
+  const Verdict verdict =
+      RunDamage({.seed = test::TestSeed(16), .damages = 150, .forgeries = 150, .salvageEvery = 25});
+  ExpectSound(verdict);
+  EXPECT_EQ(verdict.CountOf("damages"), 150u);
+  EXPECT_GT(verdict.CountOf("forgeries found"), 10u);
 }
 
 }  // namespace
