@@ -56,6 +56,9 @@ function(vemo_library name)
   string(REGEX REPLACE "^vemo_" "" export_name ${name})
   add_library(vemo::${export_name} ALIAS ${name})
   target_link_libraries(${name} PUBLIC vemo_options PRIVATE $<BUILD_INTERFACE:vemo_build>)
+  if(VEMO_FUZZ)  # so that the fuzzer sees which way an input took
+    target_compile_options(${name} PRIVATE -fsanitize=fuzzer-no-link)
+  endif()
   # The sonames carry the minor version while the major one is 0: any minor version may change the interface.
   set_target_properties(${name} PROPERTIES
     EXPORT_NAME ${export_name}
