@@ -2,6 +2,7 @@
 
 #include <utility>
 
+#include "store/collect.h"
 #include "store/statistics.h"
 #include "store/verify.h"
 #include "tests/support/keys.h"
@@ -120,6 +121,13 @@ void AssignAndSwap(Stage& stage) {
   Commit(stage, transaction);
 }
 
+// What is left behind here is swept in one commit.
+void LeaveBehindAndCollect(Stage& stage) {
+  AssignAndSwap(stage);
+  Collect(stage.space());
+  stage.Acknowledge();
+}
+
 void ReadSnapshots(Stage& stage) {
   Snapshot first(stage.space(), "first");
   ReadAll(first);
@@ -172,6 +180,7 @@ const std::vector<Scenario>& FaultScenarios() {
       {"rename, delete, make and own roots", true, ChangeRoots},
       {"change meta values", true, ChangeMeta},
       {"assign, swap and load maps", true, AssignAndSwap},
+      {"collect", true, LeaveBehindAndCollect},
       {"read and refresh snapshots", true, ReadSnapshots},
       {"abort", true, AbortChanges},
       {"reopen", true, Reopen},

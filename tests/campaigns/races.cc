@@ -6,8 +6,10 @@
 #include <optional>
 #include <random>
 #include <thread>
+#include <utility>
 #include <vector>
 
+#include "store/collect.h"
 #include "store/transaction.h"
 #include "store/verify.h"
 #include "tests/campaigns/scratch_folder.h"
@@ -50,10 +52,13 @@ class Races {
 
  private:
   void RunOn(const std::string& uri) {
-    m_space = CSpace::Open(uri, {.create = true});
+    SpaceOptions options;
+    options.create = true;
+    options.writerTimeout = std::chrono::hours(1);  // collection and the writer wait for one another
+    m_space = CSpace::Open(uri, options);
     m_random.seed(m_options.seed);
     Commit(0);
-    std::barrier start(static_cast<std::ptrdiff_t>(m_options.readers) + 1);
+    std::barrier start(static_cast<std::ptrdiff_t>(m_options.readers) + 2);
     std::vector<std::thread> readers;
     for (std::uint64_t reader = 0; reader < m_options.readers; ++reader) {
       readers.emplace_back([this, reader, &start] {
@@ -61,14 +66,28 @@ class Races {
         Guard([&] { Read(reader); });
       });
     }
+    std::thread collector([this, &start] {
+      start.arrive_and_wait();
+      Guard([&] {
+        for (std::uint64_t n = 0; n < m_options.collections; ++n) {
+          m_swept += Collect(*m_space, {.recordsPerCommit = 8}).swept;
+        }
+      });
+    });
     start.arrive_and_wait();
     Guard([&] {
       for (std::uint64_t n = 1; n <= m_options.commits; ++n) Commit(n);
     });
     for (std::thread& reader : readers) reader.join();
+    collector.join();
+    m_swept += Collect(*m_space).swept;
     Snapshot snapshot(*m_space);
-    for (const Finding& finding : VerifySpace(snapshot).findings) AddFault(finding.fault);
+    const VerifyReport report = VerifySpace(snapshot);
+    for (const Finding& finding : report.findings) AddFault(finding.fault);
+    if (report.unreachable != 0) AddFault("collection has left " + std::to_string(report.unreachable) + " records behind");
     m_verdict.Count("commits", m_options.commits);
+    m_verdict.Count("collections", m_options.collections);
+    m_verdict.Count("records collected", std::exchange(m_swept, 0));
     m_verdict.Count("reads", m_options.reads * m_options.readers);
   }
 
@@ -90,6 +109,7 @@ class Races {
     WriteTransaction transaction(*m_space);
     auto& insertions = transaction.Root<InsertionsMap>("i");
     auto& tombstones = transaction.Root<TombstonesMap>("t");
+    if (number % 16 == 5) transaction.Root<TombstonesMap>("copy") = tombstones;  // leaves the last copy to collection
     if (number % 64 == 63) {
       insertions.clear();
       tombstones.clear();
@@ -135,7 +155,8 @@ class Races {
   RacesOptions m_options;
   std::mutex m_mutex;  // of the verdict
   Verdict m_verdict;
-  std::mt19937_64 m_random;  // the writer's
+  std::mt19937_64 m_random;    // the writer's
+  std::uint64_t m_swept = 0;   // the collector's, and after it the writer's
   std::unique_ptr<CSpace> m_space;
 };
 

@@ -1,4 +1,4 @@
-// One writer and readers on threads of their own: every reader sees one commit, as a whole.
+// One writer, readers and collection on threads of their own: every reader sees one commit, as a whole.
 #pragma once
 
 #include <cstdint>
@@ -12,6 +12,7 @@ struct RacesOptions {
   std::uint64_t commits = 2'000;  // of the writer, on each engine
   std::uint64_t reads = 2'000;    // of each reader: of a snapshot's maps as a whole
   std::uint64_t readers = 4;
+  std::uint64_t collections = 200;
   std::uint64_t keys = 2'000;
 };
 

@@ -62,7 +62,7 @@ class Soak {
     m_verdict.Count("operations", m_done);
     m_verdict.Count("commits", m_commits);
     m_verdict.Count("entries at the end", m_model.size());
-    if (m_options.judgeMemory) JudgeMemory();
+    if (m_options.operations >= 60 * m_options.keys) JudgeMemory();
     return m_verdict;
   }
 

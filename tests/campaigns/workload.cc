@@ -173,13 +173,13 @@ void Workload::Abort(CSpace& space) const {
 
 std::uint64_t CommitsIn(Snapshot& snapshot) { return NumberIn(snapshot.Meta(kCommits)); }
 
-std::string Differences(Snapshot& snapshot, const Model& model) {
+std::string Differences(Snapshot& snapshot, const Model& model, LeftBehind leftBehind) {
   std::string text;
   const VerifyReport report = VerifySpace(snapshot);
   for (const Finding& finding : report.findings) text += finding.root + ": " + finding.fault + "\n";
-  const std::uint64_t leftBehind = NumberIn(snapshot.Meta(kLeftBehind));
-  if (report.unreachable != leftBehind) {
-    text += std::to_string(report.unreachable) + " records are reached by nothing, " + std::to_string(leftBehind) +
+  const std::uint64_t left = NumberIn(snapshot.Meta(kLeftBehind));
+  if (report.unreachable > left || (report.unreachable < left && leftBehind == LeftBehind::kIsThere)) {
+    text += std::to_string(report.unreachable) + " records are reached by nothing, " + std::to_string(left) +
             " were left behind by assignments\n";
   }
   if (!text.empty()) return text;

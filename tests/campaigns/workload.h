@@ -87,8 +87,11 @@ class Workload {
 // How many commits of a workload a space has had.
 std::uint64_t CommitsIn(Snapshot& snapshot);
 
+// What assignments have left to collection: all of it must be there still, or perhaps not.
+enum class LeftBehind : std::uint8_t { kIsThere, kPerhapsCollected };
+
 // What is wrong with the space behind the snapshot if it should hold `model`: differences, findings of the checker, records
 // that nothing reaches beyond those that the workload has left behind. Empty when nothing is.
-std::string Differences(Snapshot& snapshot, const Model& model);
+std::string Differences(Snapshot& snapshot, const Model& model, LeftBehind leftBehind = LeftBehind::kIsThere);
 
 }  // namespace vemo::campaign
