@@ -1,7 +1,8 @@
 # The headers that users of an installed vemo can include: the umbrella headers, a few that stand beside them for those who
 # write an engine or examine a space, and all that these include.
 function(vemo_list_public_headers result)
-  set(pending vemo/maps.h vemo/store.h store/collect.h store/engine.h store/raw_check.h store/reading_engine.h store/salvage.h store/statistics.h store/verify.h)
+  set(pending vemo/maps.h vemo/store.h store/collect.h store/dump.h store/engine.h store/raw_check.h store/reading_engine.h store/salvage.h
+              store/statistics.h store/verify.h)
   if(TARGET vemo_history)
     list(APPEND pending vemo/history.h history/blame.h history/verify_history.h)
   endif()

@@ -5,6 +5,7 @@
 
 #include "history/recorder.h"
 #include "history/replay.h"
+#include "store/scan.h"
 #include "vxUtils/ByteForms.h"
 
 namespace vemo {
@@ -20,19 +21,28 @@ struct NumberRange {
 class HistoryCheck {
  public:
   explicit HistoryCheck(Snapshot& snapshot)
-      : m_insertions(snapshot.Root<FieldIdToVectorInsertionsMap>(kInsertionsRoot)),
+      : m_snapshot(snapshot),
+        m_insertions(snapshot.Root<FieldIdToVectorInsertionsMap>(kInsertionsRoot)),
         m_tombstones(snapshot.Root<FieldIdToVectorTombstonesMap>(kTombstonesRoot)),
         m_history(snapshot.Root<FieldIdToVectorInsertionsAndDeletionsMap>(kHistoryRoot)) {}
 
   std::vector<HistoryFinding> Run() {
-    for (const auto& [field, insertions] : m_insertions) CheckField(field, insertions);
-    for (const auto& [field, tombstones] : m_tombstones) RequireInserted(field, "tombstones");
-    for (const auto& [field, history] : m_history) RequireInserted(field, "a history");
+    ForEach(m_insertions, [this](const FieldId& field, const auto& insertions) { CheckField(field, insertions); });
+    ForEach(m_tombstones, [this](const FieldId& field, const auto&) { RequireInserted(field, "tombstones"); });
+    ForEach(m_history, [this](const FieldId& field, const auto&) { RequireInserted(field, "a history"); });
     CheckNumbers();
     return std::move(m_findings);
   }
 
  private:
+  template <class Map, class Check>
+  void ForEach(const Map& map, const Check& check) {
+    ScanMap(m_snapshot, map, FieldId(), [&check](const FieldId& field, const auto& payload) {
+      check(field, payload);
+      return true;
+    });
+  }
+
   void Expect(bool sound, const FieldId& field, const std::string& fault) {
     if (!sound) m_findings.push_back({field, fault});
   }
@@ -116,6 +126,7 @@ class HistoryCheck {
     }
   }
 
+  Snapshot& m_snapshot;
   const FieldIdToVectorInsertionsMap& m_insertions;
   const FieldIdToVectorTombstonesMap& m_tombstones;
   const FieldIdToVectorInsertionsAndDeletionsMap& m_history;

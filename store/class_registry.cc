@@ -4,7 +4,7 @@
 #include <map>
 #include <mutex>
 
-#include "vxOperation/src/WorkingSet/CompOp/VectorOT.h"
+#include "store/object_memory.h"
 
 namespace vemo {
 
@@ -43,7 +43,8 @@ namespace {
 template <class T>
 ClassEntry MakeEntry(bool isMap) {
   return {GetReflectedClass<T>(), IPersistable::Stubs<T>::GetTable(),
-          [](BoundedReader& reader) { CheckForm(reader, static_cast<const T*>(nullptr)); }, isMap};
+          [](BoundedReader& reader) { CheckForm(reader, static_cast<const T*>(nullptr)); },
+          [](const void* object) { return MemoryBytesOf(static_cast<const T*>(object)); }, isMap};
 }
 
 const std::array<ClassEntry, 9>& Entries() {

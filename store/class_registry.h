@@ -1,6 +1,7 @@
 // The classes that records can be of.
 #pragma once
 
+#include <cstddef>
 #include <string_view>
 
 #include "vxPersistStore/Reflection.h"
@@ -12,6 +13,7 @@ struct ClassEntry {
   const ReflectedClass* reflected;
   const IPersistable::FnTable* table;
   void (*checkForm)(BoundedReader& reader);  // throws MalformedBytes on a body that Deserialise must not see
+  std::size_t (*memoryBytes)(const void* object);  // what it takes in memory, its heap included
   bool isMap;
 
   std::string_view Name() const noexcept { return reflected->m_name; }

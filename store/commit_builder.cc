@@ -1,6 +1,7 @@
 #include "store/commit_builder.h"
 
 #include "platform/error.h"
+#include "store/decoded_object.h"
 #include "store/envelope.h"
 #include "vxUtils/Archive.h"
 
@@ -114,11 +115,8 @@ void CommitBuilder::SweepQueue(std::size_t limit) {
     if (!record) continue;
     m_batch.removedRecords.push_back(oid);
     try {
-      struct Destroyer {
-        ptr<IPersistable> object;
-        ~Destroyer() { DestroyObject(object); }
-      } const decoded{m_view.Decode(oid, *record)};
-      for (const prefbase& child : OwnedReferences(decoded.object)) m_batch.queuedDeletions.push_back(child.m_oid);
+      const DecodedObject decoded(m_view.Decode(oid, *record));
+      for (const prefbase& child : OwnedReferences(decoded.Get())) m_batch.queuedDeletions.push_back(child.m_oid);
     } catch (const CorruptRecord&) {
       continue;
     }

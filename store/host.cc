@@ -58,9 +58,13 @@ void AsyncPermanentlyDeleteSubTree(ptr<IPersistable> root) { TransactionFor(root
 void OnGarbageCollectPersistable(ptr<IPersistable> object) { SysStateOf(object).m_cspace = nullptr; }
 
 void MutationInterrupted(ptr<const IPersistable> map) noexcept {
-  const CSpace* space = SysStateOf(map).m_cspace;
+  CSpace* space = SysStateOf(map).m_cspace;
   WriteTransaction* transaction = WriteTransaction::OnThisThread();
-  if (transaction != nullptr && (space == nullptr || WriteTransaction::IsOpenOnThisThread(*space))) transaction->Poison();
+  if (transaction != nullptr && (space == nullptr || WriteTransaction::IsOpenOnThisThread(*space))) {
+    transaction->Poison();
+  } else if (space != nullptr && !SysStateOf(map).GetFlag(kSnapshotFlag)) {
+    space->m_disturbed = true;  // by a thread that had no business there
+  }
 }
 
 // --- References ---

@@ -3,15 +3,20 @@
 // Unlike the map's own Validate, which asserts, this walks on after a fault and reports each with the node's id; it hands the
 // bounds of every node down to its outermost children, follows the chain of leaves in both directions and counts the
 // entries. A node that cannot be read is a finding, and its siblings are still checked.
+//
+// It holds on to one path from the root and a bit for each node, whatever the size of the map; what a node that was read
+// leaves in memory is its reader's affair.
 #pragma once
 
+#include <functional>
 #include <string>
-#include <unordered_set>
+#include <utility>
 #include <vector>
 
 #include "platform/error.h"
 #include "platform/field_id.h"
 #include "platform/types.h"
+#include "store/id_set.h"
 #include "vxPersistStore/pref.h"
 
 namespace vemo {
@@ -22,32 +27,47 @@ struct MapFinding {
   std::string fault;
 };
 
-template <class Map>
+// Reads nodes by following references, so that they are loaded and stay as the map's own operations leave them.
+class BoundNodeReader {
+ public:
+  struct Node {
+    ptr<IPersistable> Get() const noexcept { return object; }
+    ptr<IPersistable> object;
+  };
+  // The node behind a reference that is not empty; throws an Error where there is none.
+  Node Read(const prefbase& reference, const IPersistable::FnTable* expected) const { return {reference.GetAs(expected)}; }
+};
+
+// A reader returns holders: each keeps its node readable as long as it lives.
+template <class Map, class Reader = BoundNodeReader>
 class MapCheck {
  public:
-  explicit MapCheck(const Map& map) : m_map(map) {}
+  // `onNode` is called with the id of each node that is reached.
+  explicit MapCheck(const Map& map, Reader reader = {}, std::function<void(OID)> onNode = {})
+      : m_map(map), m_reader(std::move(reader)), m_onNode(std::move(onNode)) {}
 
-  // Loads every node. Linear in the size of the map.
+  // Reads every node. Linear in the size of the map.
   std::vector<MapFinding> Run() {
     if (m_map.m_height < 0) {
       CheckEmptyMap();
       return std::move(m_findings);
     }
     CheckNode(m_map.m_height, m_map.m_root, {nullptr, nullptr}, true, "root");
-    CheckChain();
-    ssize_t entries = 0;
-    for (const LeafNode* leaf : m_leaves) entries += leaf->m_numKeyEntrys;
-    if (!m_incomplete) {
-      Expect(entries == m_map.m_size, OID(), "map",
-             "the size is " + std::to_string(m_map.m_size) + ", but there are " + std::to_string(entries) + " entries");
-    }
+    if (m_incomplete) return std::move(m_findings);
+    // Where a node could not be read, a broken chain or another size cannot be told apart from the hole, and the finding about
+    // that node stands for it.
+    CheckEndsOfChain();
+    m_findings.insert(m_findings.end(), m_chainFindings.begin(), m_chainFindings.end());
+    Expect(m_numEntries == m_map.m_size, OID(), "map",
+           "the size is " + std::to_string(m_map.m_size) + ", but there are " + std::to_string(m_numEntries) + " entries");
     return std::move(m_findings);
   }
 
-  // The nodes that Run has visited.
-  const std::unordered_set<OID>& Visited() const noexcept { return m_visited; }
+  // How many nodes Run has reached.
+  std::size_t NumVisited() const noexcept { return m_visited.size(); }
 
  private:
+  using Holder = decltype(std::declval<const Reader&>().Read(std::declval<const prefbase&>(), nullptr));
   using LeafNode = typename Map::LeafNode;
   using InternalNode = typename Map::InternalNode;
   static constexpr ssize_t kCapacity = sizeof(LeafNode::m_entrys) / sizeof(typename LeafNode::KeyEntry);
@@ -69,33 +89,35 @@ class MapCheck {
     Expect(!m_map.m_root && !m_map.m_firstLeaf && !m_map.m_lastLeaf, OID(), "map", "a map without nodes has references");
   }
 
-  // The node behind a reference, or null after a finding.
-  void* Load(const prefbase& reference, ssize_t height, const std::string& where) {
+  // The node behind a reference, or nothing after a finding.
+  Holder Load(const prefbase& reference, ssize_t height, const std::string& where) {
     if (!reference) {
       m_incomplete = true;
       Find(OID(), where, "the reference is empty");
-      return nullptr;
+      return {};
     }
-    if (!m_visited.insert(reference.m_oid).second) {
+    if (!m_visited.Insert(reference.m_oid)) {
       m_incomplete = true;
       Find(reference.m_oid, where, "the node hangs in the tree twice");
-      return nullptr;
+      return {};
     }
+    if (m_onNode) m_onNode(reference.m_oid);
     const auto* expected =
         height > 0 ? IPersistable::Stubs<InternalNode>::GetTable() : IPersistable::Stubs<LeafNode>::GetTable();
     try {
-      const ptr<IPersistable> node = reference.GetAs(expected);
-      if (node.Table() == expected) return node.m_self;
+      Holder node = m_reader.Read(reference, expected);
+      if (node.Get().Table() == expected) return node;
       Find(reference.m_oid, where, "a node of the wrong class at height " + std::to_string(height));
     } catch (const Error& error) {
       Find(reference.m_oid, where, error.what());
     }
     m_incomplete = true;
-    return nullptr;
+    return {};
   }
 
   void CheckNode(ssize_t height, const prefbase& reference, Bounds bounds, bool isRoot, const std::string& where) {
-    void* node = Load(reference, height, where);
+    const Holder holder = Load(reference, height, where);
+    const void* node = holder.Get().m_self;
     if (node == nullptr) return;
     if (height > 0) {
       CheckInternalNode(height, reference.m_oid, *static_cast<const InternalNode*>(node), bounds, isRoot, where);
@@ -121,8 +143,8 @@ class MapCheck {
       CheckKey(oid, previous, leaf.GetEntry(i).first, bounds, where);
       previous = &leaf.GetEntry(i).first;
     }
-    m_leaves.push_back(&leaf);
-    m_leafIds.push_back(oid);
+    m_numEntries += leaf.m_numKeyEntrys;
+    CheckLink(oid, leaf);
   }
 
   void CheckInternalNode(ssize_t height, OID oid, const InternalNode& node, Bounds bounds, bool isRoot,
@@ -137,27 +159,38 @@ class MapCheck {
     }
   }
 
-  // By ids: every leaf's neighbours must be those that the tree gives it. Where a node could not be read, a broken chain
-  // cannot be told apart from the hole, and the finding about that node stands for it.
-  void CheckChain() {
-    if (m_incomplete) return;
-    const std::size_t n = m_leaves.size();
-    Expect(m_map.m_firstLeaf.m_oid == m_leafIds.front(), OID(), "map", "its first leaf is not the tree's");
-    Expect(m_map.m_lastLeaf.m_oid == m_leafIds.back(), OID(), "map", "its last leaf is not the tree's");
-    for (std::size_t i = 0; i < n; ++i) {
-      const OID before = i > 0 ? m_leafIds[i - 1] : OID();
-      const OID behind = i + 1 < n ? m_leafIds[i + 1] : OID();
-      const std::string where = "leaf " + std::to_string(i);
-      Expect(m_leaves[i]->m_prev.m_oid == before, m_leafIds[i], where, "its left neighbour is not the tree's");
-      Expect(m_leaves[i]->m_next.m_oid == behind, m_leafIds[i], where, "its right neighbour is not the tree's");
-    }
+  // By ids: a leaf's left neighbour must be the leaf that came before it in the tree, whose right neighbour it must be.
+  void CheckLink(OID oid, const LeafNode& leaf) {
+    if (m_numLeaves == 0) m_firstLeaf = oid;
+    ExpectLink(m_lastNext, oid, m_lastLeaf, m_numLeaves - 1, "right");
+    ExpectLink(leaf.m_prev.m_oid, m_lastLeaf, oid, m_numLeaves, "left");
+    m_lastLeaf = oid;
+    m_lastNext = leaf.m_next.m_oid;
+    ++m_numLeaves;
+  }
+
+  void ExpectLink(OID found, OID expected, OID leaf, ssize_t number, const std::string& side) {
+    if (found == expected || number < 0) return;
+    m_chainFindings.push_back({leaf, "leaf " + std::to_string(number), "its " + side + " neighbour is not the tree's"});
+  }
+
+  void CheckEndsOfChain() {
+    ExpectLink(m_lastNext, OID(), m_lastLeaf, m_numLeaves - 1, "right");
+    Expect(m_map.m_firstLeaf.m_oid == m_firstLeaf, OID(), "map", "its first leaf is not the tree's");
+    Expect(m_map.m_lastLeaf.m_oid == m_lastLeaf, OID(), "map", "its last leaf is not the tree's");
   }
 
   const Map& m_map;
+  const Reader m_reader;
+  const std::function<void(OID)> m_onNode;
   std::vector<MapFinding> m_findings;
-  std::unordered_set<OID> m_visited;
-  std::vector<const LeafNode*> m_leaves;
-  std::vector<OID> m_leafIds;
+  std::vector<MapFinding> m_chainFindings;
+  IdSet m_visited;
+  ssize_t m_numEntries = 0;
+  ssize_t m_numLeaves = 0;
+  OID m_firstLeaf;
+  OID m_lastLeaf;  // of those so far
+  OID m_lastNext;  // its right neighbour
   bool m_incomplete = false;  // part of the tree could not be read
 };
 

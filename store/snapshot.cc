@@ -40,11 +40,11 @@ Snapshot::Snapshot(CSpace& space, std::string owner)
     : m_space(space),
       m_owner(std::move(owner)),
       m_opened(space.m_options.clock()),
-      m_view(space, space.m_engine->Name(), View::Kind::kSnapshot) {
+      m_view(space, space.m_engine->Name(), View::Kind::kSnapshot, space.m_counters, space.m_options.cacheSeed) {
+  space.RequireThisProcess();
   Begin();
   m_view.Attach(space.m_engine->OpenSnapshot());
-  const std::lock_guard lock(space.m_snapshotsMutex);
-  space.m_snapshots.insert(this);
+  space.EnterSnapshot(*this);
 }
 
 // Starts the snapshot's age.
@@ -58,21 +58,30 @@ void Snapshot::Begin() {
 }
 
 void Snapshot::Refresh() {
+  const UseCheck::Scope use(m_view.Use(), m_space.Name(), m_view.UseName());
   auto state = m_space.m_engine->OpenSnapshot();
   Begin();
+  m_view.Trim(m_space.Allowance());
   m_view.MoveTo(std::move(state));
 }
+
+bool Snapshot::TrimTo(std::size_t bytes) {
+  const UseCheck::Scope use(m_view.Use(), m_space.Name(), m_view.UseName());
+  return m_view.Trim(bytes);
+}
+
+void Snapshot::RequireUse() const { m_view.Use().RequireThisProcess(m_space.Name(), m_view.UseName()); }
 
 ReaderInfo Snapshot::Describe(std::chrono::steady_clock::time_point now) const {
   return {m_owner, getpid(), m_view.Generation(), std::chrono::duration_cast<std::chrono::milliseconds>(now - m_opened)};
 }
 
 Snapshot::~Snapshot() {
-  const std::lock_guard lock(m_space.m_snapshotsMutex);
-  m_space.m_snapshots.erase(this);
+  if (m_view.Use().IsOfThisProcess()) m_space.LeaveSnapshot(*this);
 }
 
 ptr<IPersistable> Snapshot::RootMap(std::string_view name) {
+  const UseCheck::Scope use(m_view.Use(), m_space.Name(), m_view.UseName());
   const View::Root* root = m_view.FindRoot(name);
   if (root == nullptr) throw UsageError(m_space.Name() + ": it has no root map \"" + std::string(name) + "\"");
   return root->map;
@@ -85,10 +94,12 @@ void Snapshot::RefuseRoot(std::string_view name, const IPersistable::FnTable* ta
 }
 
 bool Snapshot::HasRoot(std::string_view name) const {
+  RequireUse();
   return m_view.State().ReadNamed(NamedTable::kRoots, name).has_value();
 }
 
 std::vector<std::string> Snapshot::RootNames() const {
+  RequireUse();
   std::vector<std::string> names;
   m_view.State().ScanNamed(NamedTable::kRoots, "", [&](std::string_view name, ByteView) {
     if (name.front() != '\0') names.emplace_back(name);
@@ -98,11 +109,13 @@ std::vector<std::string> Snapshot::RootNames() const {
 }
 
 std::optional<std::string> Snapshot::Meta(std::string_view name) const {
+  RequireUse();
   return ReadMeta(m_view.State(), m_space.Name(), name);
 }
 
 void Snapshot::ScanMeta(std::string_view prefix,
                         const std::function<bool(std::string_view, std::string_view)>& visit) const {
+  RequireUse();
   ScanStoredMeta(m_view.State(), m_space.Name(), prefix, visit);
 }
 

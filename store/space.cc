@@ -2,6 +2,7 @@
 
 #include <algorithm>
 #include <cstring>
+#include <new>
 
 #include "engines/lmdb/lmdb_engine.h"
 #include "engines/memory/memory_engine.h"
@@ -58,9 +59,10 @@ CSpace::CSpace(std::string name, std::unique_ptr<Engine> engine, const SpaceOpti
     : m_name(std::move(name)),
       m_engine(std::move(engine)),
       m_options(options),
-      m_writerView(*this, m_engine->Name(), View::Kind::kWriter) {}
+      m_writerView(*this, m_engine->Name(), View::Kind::kWriter, m_counters, m_options.cacheSeed) {}
 
 CSpace::~CSpace() {
+  if (!m_writerView.Use().IsOfThisProcess()) return;  // what is open is the parent's
   VEMO_ASSERT_TEXT(m_snapshots.empty(), "no snapshot is open when its space is closed");
   const std::unique_lock idle(m_writerMutex, std::try_to_lock);
   VEMO_ASSERT_TEXT(idle.owns_lock(), "no transaction is open when its space is closed");
@@ -70,7 +72,8 @@ std::string CSpace::OptionsText() const {
   return m_name + " create=" + (m_options.create ? "yes" : "no") +
          " writer_timeout_ms=" + std::to_string(m_options.writerTimeout.count()) +
          " reader_warning_age_ms=" + AgeText(m_options.readerWarningAge) +
-         " reader_max_age_ms=" + AgeText(m_options.readerMaxAge);
+         " reader_max_age_ms=" + AgeText(m_options.readerMaxAge) +
+         " cache_bytes=" + (m_options.cacheBytes ? std::to_string(*m_options.cacheBytes) : "none");
 }
 
 // A new space gets its format number in its first commit; an older program must not touch a newer space.
@@ -133,6 +136,38 @@ void CSpace::WarnOfOldReaders() noexcept try {
   return;
 }
 
+// --- Bounded memory ---
+
+std::size_t CSpace::Allowance() const noexcept {
+  return m_options.cacheBytes ? *m_options.cacheBytes / m_numViews.load(std::memory_order_relaxed) : kUnbounded;
+}
+
+void CSpace::TrimWriter() noexcept {
+  try {
+    m_writerView.Trim(Allowance());
+  } catch (const std::bad_alloc&) {
+    // Nothing has left memory; the next transaction tries again.
+  }
+}
+
+void CSpace::EnterSnapshot(Snapshot& snapshot) {
+  {
+    const std::lock_guard lock(m_snapshotsMutex);
+    m_snapshots.insert(&snapshot);
+    m_numViews.store(m_snapshots.size() + 1, std::memory_order_relaxed);
+  }
+  // The writer's share has become smaller. An open transaction sees to that itself when it ends.
+  if (!m_options.cacheBytes || WriteTransaction::IsOpenOnThisThread(*this) || !m_writerMutex.try_lock()) return;
+  TrimWriter();
+  m_writerMutex.unlock();
+}
+
+void CSpace::LeaveSnapshot(Snapshot& snapshot) noexcept {
+  const std::lock_guard lock(m_snapshotsMutex);
+  m_snapshots.erase(&snapshot);
+  m_numViews.store(m_snapshots.size() + 1, std::memory_order_relaxed);
+}
+
 OID CSpace::NextId() {
   if (m_nextId == m_idLimit) {
     m_nextId = m_engine->ReserveIds(m_nextIdRange).m_value;
@@ -159,10 +194,14 @@ void CSpace::RefuseMark(ptr<const IPersistable> object) {
       oid, className,
       oid.IsNull() ? "the root was never committed or is gone; ask the transaction for it again"
                    : "it was changed outside a transaction of this thread; open a WriteTransaction first");
-  // What the change has left half-done must not be seen by the next transaction.
-  if (!WriteTransaction::IsOpenOnThisThread(*this) && m_writerMutex.try_lock()) {
-    m_writerView.ForgetResidents();
-    m_writerMutex.unlock();
+  // What the change has left half-done must be seen neither by the next transaction nor by one that is open.
+  if (!WriteTransaction::IsOpenOnThisThread(*this)) {
+    if (m_writerMutex.try_lock()) {
+      m_writerView.ForgetResidents();
+      m_writerMutex.unlock();
+    } else {
+      m_disturbed = true;
+    }
   }
   throw UsageError(message);
 }

@@ -1,29 +1,16 @@
 #include "store/statistics.h"
 
 #include <algorithm>
-#include <unordered_set>
 
 #include "platform/error.h"
 #include "store/commit_builder.h"
+#include "store/decoded_object.h"
+#include "store/id_set.h"
 #include "vxOperation/src/WorkingSet/CompOp/VectorOT.h"
 
 namespace vemo {
 
 namespace {
-
-// An object that belongs to nobody else.
-class DecodedObject {
- public:
-  explicit DecodedObject(ptr<IPersistable> object) noexcept : m_object(object) {}
-  ~DecodedObject() { DestroyObject(m_object); }
-  DecodedObject(const DecodedObject&) = delete;
-  DecodedObject& operator=(const DecodedObject&) = delete;
-
-  ptr<IPersistable> Get() const noexcept { return m_object; }
-
- private:
-  ptr<IPersistable> m_object;
-};
 
 class DiscardingStream : public IOutputStream {
  public:
@@ -83,50 +70,40 @@ class Collector {
     m_statistics.maps.push_back(std::move(map));
   }
 
-  // Walks the tree from the root down, a level at a time.
   template <class Map>
   void AddMapOfClass(ptr<IPersistable> object, MapStatistics& statistics) {
     if (object.Table() != IPersistable::Stubs<Map>::GetTable()) return;
     const auto& map = *static_cast<const Map*>(object.m_self);
     statistics.height = map.m_height;
     statistics.levels.resize(static_cast<std::size_t>(map.m_height + 1));
-    std::vector<OID> nodes;
-    if (map.m_height >= 0) nodes.push_back(map.m_root.m_oid);
-    for (ssize_t height = map.m_height; height >= 0; --height) {
-      LevelStatistics& level = statistics.levels[static_cast<std::size_t>(height)];
-      nodes = height > 0 ? AddInternalLevel<typename Map::InternalNode>(nodes, level)
-                         : AddLeaves<typename Map::LeafNode>(nodes, level, statistics);
+    if (map.m_height >= 0) AddNode<Map>(map.m_height, map.m_root.m_oid, statistics);
+    for (const LevelStatistics& level : statistics.levels) {
       statistics.nodes += level.nodes;
       statistics.recordBytes += level.recordBytes;
     }
     if (!statistics.levels.empty()) statistics.entries = statistics.levels.front().entries;
   }
 
-  // Returns the children.
-  template <class Node>
-  std::vector<OID> AddInternalLevel(const std::vector<OID>& nodes, LevelStatistics& level) {
-    level.capacity = Capacity<Node>();
-    std::vector<OID> children;
-    for (const OID oid : nodes) {
-      const ByteView record = Reach(oid);
-      const DecodedObject decoded(Decode<Node>(oid, record));
-      CountNode(level, As<Node>(decoded).m_numKeyEntrys, record.size());
-      for (const prefbase& child : OwnedReferences(decoded.Get())) children.push_back(child.m_oid);
+  // Depth first, so that one path from the root is in memory at a time.
+  template <class Map>
+  void AddNode(ssize_t height, OID oid, MapStatistics& statistics) {
+    LevelStatistics& level = statistics.levels[static_cast<std::size_t>(height)];
+    const ByteView record = Reach(oid);
+    if (height == 0) {
+      const DecodedObject leaf = Decode<typename Map::LeafNode>(oid, record);
+      AddToLevel<typename Map::LeafNode>(level, leaf, record.size());
+      AddPayloads(leaf.As<typename Map::LeafNode>(), statistics);
+      return;
     }
-    return children;
+    const DecodedObject node = Decode<typename Map::InternalNode>(oid, record);
+    AddToLevel<typename Map::InternalNode>(level, node, record.size());
+    for (const prefbase& child : OwnedReferences(node.Get())) AddNode<Map>(height - 1, child.m_oid, statistics);
   }
 
   template <class Node>
-  std::vector<OID> AddLeaves(const std::vector<OID>& leaves, LevelStatistics& level,
-                             MapStatistics& statistics) {
-    level.capacity = Capacity<Node>();
-    for (const OID oid : leaves) {
-      const ByteView record = Reach(oid);
-      const DecodedObject decoded(Decode<Node>(oid, record));
-      CountNode(level, As<Node>(decoded).m_numKeyEntrys, record.size());
-      AddPayloads(As<Node>(decoded), statistics);
-    }
-    return {};
+  static void AddToLevel(LevelStatistics& level, const DecodedObject& node, std::size_t recordBytes) {
+    level.capacity = sizeof(Node::m_entrys) / sizeof(typename Node::KeyEntry);
+    CountNode(level, node.As<Node>().m_numKeyEntrys, recordBytes);
   }
 
   template <class Node>
@@ -143,20 +120,9 @@ class Collector {
   }
 
   template <class Node>
-  static constexpr std::uint64_t Capacity() {
-    return sizeof(Node::m_entrys) / sizeof(typename Node::KeyEntry);
-  }
-
-  template <class Node>
-  static const Node& As(const DecodedObject& decoded) {
-    return *static_cast<const Node*>(decoded.Get().m_self);
-  }
-
-  template <class Node>
-  ptr<IPersistable> Decode(OID oid, ByteView record) {
-    const ptr<IPersistable> object = m_snapshot.Objects().Decode(oid, record);
-    if (object.Table() == IPersistable::Stubs<Node>::GetTable()) return object;
-    const DecodedObject other(object);
+  DecodedObject Decode(OID oid, ByteView record) {
+    DecodedObject object(m_snapshot.Objects().Decode(oid, record));
+    if (object.Get().Table() == IPersistable::Stubs<Node>::GetTable()) return object;
     Refuse<CorruptRecord>(oid, "a node of another class should stand here");
   }
 
@@ -164,7 +130,7 @@ class Collector {
   ByteView Reach(OID oid) {
     const std::optional<ByteView> record = State().Read(oid);
     if (!record) Refuse<DanglingReference>(oid, "it is referred to, but there is no record of it");
-    if (!m_reached.insert(oid).second) Refuse<CorruptRecord>(oid, "it hangs in the maps twice");
+    if (!m_reached.Insert(oid)) Refuse<CorruptRecord>(oid, "it hangs in the maps twice");
     if (m_progress) m_progress(m_reached.size());
     return *record;
   }
@@ -183,7 +149,7 @@ class Collector {
       const OID oid = pending.back();
       pending.pop_back();
       const std::optional<ByteView> record = State().Read(oid);
-      if (!record || !m_reached.insert(oid).second) continue;
+      if (!record || !m_reached.Insert(oid)) continue;
       Add(m_statistics.awaitingDeletion, record->size());
       if (m_progress) m_progress(m_reached.size());
       try {
@@ -198,7 +164,7 @@ class Collector {
   void AddRecords() {
     State().ScanRecords(OID(1), [this](OID oid, ByteView record) {
       Add(m_statistics.records, record.size());
-      if (!m_reached.contains(oid)) Add(m_statistics.unreachable, record.size());
+      if (!m_reached.Contains(oid)) Add(m_statistics.unreachable, record.size());
       return true;
     });
   }
@@ -207,7 +173,7 @@ class Collector {
   const std::function<void(std::uint64_t)>& m_progress;
   SpaceStatistics m_statistics;
   std::vector<std::string> m_rootNames;
-  std::unordered_set<OID> m_reached;  // by the maps, then by the queue
+  IdSet m_reached;  // by the maps, then by the queue
 };
 
 }  // namespace

@@ -73,7 +73,7 @@ struct SpaceStatistics {
 };
 
 // Reads every record once and keeps none of them in memory: the snapshot does not grow, beyond its root maps.
-// Takes memory for the ids of all records. `progress` is told how many records are done. Throws CorruptRecord
+// Takes the memory of one path from a root, and a bit for each record. `progress` is told how many records are done. Throws CorruptRecord
 // where a record of a map is damaged or missing (VerifySpace finds all such), IncompatibleSpace, or what the
 // engine throws.
 SpaceStatistics CollectStatistics(Snapshot& snapshot,

@@ -4,9 +4,11 @@
 #include <set>
 #include <utility>
 
+#include "platform/assertion.h"
 #include "platform/error.h"
 #include "store/commit_builder.h"
 #include "store/commit_outcome.h"
+#include "store/decoded_object.h"
 #include "store/envelope.h"
 #include "store/snapshot.h"
 
@@ -30,6 +32,21 @@ void CheckRootName(std::string_view name) {
   if (name.front() == '\0') throw UsageError("the name of a root map cannot start with a zero byte");
 }
 
+// What a stored object owns, read without keeping it; nothing where it cannot be read, since whoever works off the queue of
+// deletions deletes it all the same.
+std::optional<std::vector<OID>> ReadOwnedIds(View& view, OID oid) {
+  const std::optional<ByteView> record = view.State().Read(oid);
+  if (!record) return std::nullopt;
+  try {
+    const DecodedObject object(view.Decode(oid, *record));
+    std::vector<OID> ids;
+    for (const prefbase& child : OwnedReferences(object.Get())) ids.push_back(child.m_oid);
+    return ids;
+  } catch (const CorruptRecord&) {
+    return std::nullopt;
+  }
+}
+
 const ClassEntry& MapClass(const IPersistable::FnTable* table) {
   const ClassEntry* entry = FindClass(table);
   if (entry == nullptr || !entry->isMap) throw UsageError("only the three maps can be roots of a space");
@@ -45,6 +62,7 @@ bool WriteTransaction::IsOpenOnThisThread(const CSpace& space) noexcept {
 }
 
 WriteTransaction::WriteTransaction(CSpace& space) : m_space(space) {
+  space.RequireThisProcess();
   if (t_transaction != nullptr) {
     throw UsageError(space.Name() + ": this thread has a transaction open; commit or end it before opening another");
   }
@@ -53,12 +71,18 @@ WriteTransaction::WriteTransaction(CSpace& space) : m_space(space) {
     throw SpaceBusy(space.Name() + ": another thread's transaction is still open; try again");
   }
   m_engineLock = space.m_engine->LockWriter(space.m_options.writerTimeout);
+  vemo::View& view = space.m_writerView;
+  m_use.BindToThisThread();
+  view.Use().BindToThisThread();
   try {
-    space.m_writerView.Attach(space.m_engine->OpenSnapshot());
+    if (space.m_disturbed.exchange(false)) view.ForgetResidents();
+    view.Attach(space.m_engine->OpenSnapshot());
   } catch (...) {
-    space.m_writerView.Detach();  // an open state would keep the engine from growing
+    view.Detach();  // an open state would keep the engine from growing
+    view.Use().Unbind();
     throw;
   }
+  space.TrimWriter();
   m_open = true;
   t_transaction = this;
 }
@@ -66,6 +90,12 @@ WriteTransaction::WriteTransaction(CSpace& space) : m_space(space) {
 WriteTransaction::~WriteTransaction() {
   if (!m_open) return;
   vemo::View& view = m_space.m_writerView;
+  if (!m_use.IsOfThisProcess()) {
+    view.ForgetResidents();  // the copy in this process; the transaction goes on in the parent
+    Finish();
+    return;
+  }
+  VEMO_ASSERT_TEXT(t_transaction == this, "a transaction ends on the thread that opened it");
   if (HasChanges()) {
     view.ForgetResidents();
     try {
@@ -81,6 +111,7 @@ WriteTransaction::~WriteTransaction() {
 }
 
 bool WriteTransaction::HasChanges() const noexcept {
+  if (m_space.m_disturbed.exchange(false)) return true;
   if (m_poisoned || !m_dirty.empty() || !m_new.empty() || !m_deletedIds.empty() || !m_removedRoots.empty()) return true;
   for (const auto& [name, root] : m_space.m_writerView.Roots()) {
     if (!root.committed && !root.oid.IsNull()) return true;
@@ -92,14 +123,22 @@ bool WriteTransaction::HasChanges() const noexcept {
 void WriteTransaction::Finish() noexcept {
   for (const Deleted& deleted : m_deleted) DestroyObject(deleted.object);
   m_deleted.clear();
+  m_space.TrimWriter();
   m_space.m_writerView.Detach();
+  m_space.m_writerView.Use().Unbind();
   m_open = false;
   t_transaction = nullptr;
   m_engineLock.reset();
   m_processLock.unlock();
 }
 
+bool WriteTransaction::TrimTo(std::size_t bytes) {
+  RequireOpen();
+  return m_space.m_writerView.Trim(bytes);
+}
+
 void WriteTransaction::RequireOpen() const {
+  m_use.RequireThisThread(m_space.Name(), "the transaction");
   if (!m_open) throw UsageError(m_space.Name() + ": the transaction has ended; open another");
 }
 
@@ -282,6 +321,7 @@ void WriteTransaction::ScanMeta(std::string_view prefix,
 // --- What the module tells the store ---
 
 void WriteTransaction::RequireOwn(ptr<const IPersistable> object) const {
+  m_use.RequireThisProcess(m_space.Name(), "the transaction");
   const ObjSysState& state = SysStateOf(object);
   const OID oid = PersistStateOf(object).m_oid;
   const char* reason = nullptr;
@@ -298,6 +338,7 @@ void WriteTransaction::RequireOwn(ptr<const IPersistable> object) const {
 void WriteTransaction::TakeNewObject(ptr<IPersistable> object) {
   OID oid;
   try {
+    m_use.RequireThisProcess(m_space.Name(), "the transaction");
     oid = m_space.NextId();
     m_new.insert(oid);
     m_space.m_writerView.Adopt(oid, object);
@@ -312,6 +353,7 @@ void WriteTransaction::MarkDirty(ptr<const IPersistable> object) {
   RequireOwn(object);
   m_dirty.emplace(PersistStateOf(object).m_oid, ptr<IPersistable>(object.m_self, object.Table()));
   SysStateOf(object).SetFlag(ObjSysState::kDirtyFlag);
+  m_space.m_writerView.MarkedDirty(PersistStateOf(object).m_oid);
 }
 
 void WriteTransaction::CheckReachable(ptr<const IPersistable> from, ptr<const IPersistable> to) const {
@@ -336,27 +378,42 @@ void WriteTransaction::DeleteObject(ptr<IPersistable> object) {
 // What is in memory is deleted now, since nodes there may be changed or new; what is not is clean, and its id is queued:
 // later commits delete it a slice at a time.
 //
-// A leaf is also reached along the chain of leaves, so a changed one can be in memory below nodes that are not. While the
-// transaction has changed nodes left, the internal nodes are read to see whether it is they that hang there.
+// A leaf is also reached along the chain of leaves, and unchanged nodes leave memory before changed ones, so a changed node
+// can be in memory below nodes that are not. While the transaction has changed nodes left, the internal nodes are looked at
+// to see whether it is they that hang there.
 void WriteTransaction::DeleteSubTree(ptr<IPersistable> root) {
   std::vector<std::vector<OID>> absent;  // children that are not in memory, those of one node together
   DeleteResidents(root, absent);
-  while (!absent.empty() && HasDirtyNodes()) {
+  while (!absent.empty()) {
     std::vector<OID> siblings = std::move(absent.back());
     absent.pop_back();
-    bool areLeaves = false;
-    while (!siblings.empty() && !areLeaves) {
-      const ptr<IPersistable> node = LoadForDeletion(siblings.back());
-      if (node.m_self == nullptr) m_queuedDeletions.push_back(siblings.back());
-      siblings.pop_back();
-      if (node.m_self == nullptr) continue;
-      areLeaves = OwnedReferences(node).empty();
-      DeleteResidents(node, absent);
-    }
     m_queuedDeletions.insert(m_queuedDeletions.end(), siblings.begin(), siblings.end());
+    DeleteResidentsBelow(std::move(siblings), absent);
   }
-  for (const std::vector<OID>& siblings : absent) {
-    m_queuedDeletions.insert(m_queuedDeletions.end(), siblings.begin(), siblings.end());
+}
+
+// Deletes what is in memory below nodes that are not, and that the queue takes with all else below them.
+void WriteTransaction::DeleteResidentsBelow(std::vector<OID> siblings, std::vector<std::vector<OID>>& absent) {
+  vemo::View& view = m_space.m_writerView;
+  std::vector<std::vector<OID>> pending{std::move(siblings)};
+  while (!pending.empty() && HasDirtyNodes()) {
+    const std::vector<OID> nodes = std::move(pending.back());
+    pending.pop_back();
+    for (const OID node : nodes) {
+      const std::optional<std::vector<OID>> children = ReadOwnedIds(view, node);
+      if (!children) continue;
+      if (children->empty()) break;  // a leaf, and so are the others
+      std::vector<OID> missing;
+      for (const OID child : *children) {
+        const ptr<IPersistable> resident = view.Find(child);
+        if (resident.m_self != nullptr) {
+          DeleteResidents(resident, absent);
+        } else if (!m_deletedIds.contains(child)) {
+          missing.push_back(child);
+        }
+      }
+      if (!missing.empty()) pending.push_back(std::move(missing));
+    }
   }
 }
 
@@ -376,15 +433,6 @@ void WriteTransaction::DeleteResidents(ptr<IPersistable> root, std::vector<std::
     }
     if (!missing.empty()) absent.push_back(std::move(missing));
     DeleteObject(object);
-  }
-}
-
-// Null for an object that cannot be read: whoever works off the queue deletes it all the same.
-ptr<IPersistable> WriteTransaction::LoadForDeletion(OID oid) {
-  try {
-    return m_space.m_writerView.Resolve(oid, nullptr);
-  } catch (const CorruptRecord&) {
-    return {};
   }
 }
 
@@ -412,6 +460,7 @@ void WriteTransaction::DropUnreachable(OID oid) {
 
 void WriteTransaction::Commit() {
   RequireOpen();
+  if (m_space.m_disturbed.load()) m_poisoned = true;
   if (m_poisoned) {
     throw PoisonedTransaction(m_space.Name() +
                               ": a change was interrupted half-way by an exception; abort this transaction and begin again");
@@ -516,6 +565,7 @@ void WriteTransaction::AfterCommit(std::uint64_t generation, const std::unordere
     view.Release(oid);
     DestroyObject(unreached);
   }
+  for (const OID oid : written) view.Written(oid, generation);
   for (auto& [name, root] : view.Roots()) root.committed = !root.oid.IsNull();
   m_dirty.clear();
   m_new.clear();

@@ -20,7 +20,8 @@ namespace vemo {
 class CommitBuilder;
 
 // Holds the writer lock of its space, in this process and across processes, from the constructor until Commit or the
-// destructor, which aborts. Used by the thread that opened it; a thread has at most one open.
+// destructor, which aborts. Used by the thread that opened it, which a UsageError reminds another one of; a thread has at most
+// one open.
 //
 // Lifetimes: a root map keeps its address as long as the space is open; iterators and payload pointers end with the
 // transaction. Nodes of a map on the stack belong to the transaction that was open when they were made: what no root
@@ -94,6 +95,17 @@ class WriteTransaction {
   };
   DirtySize Dirty() const;
 
+  // Has loaded nodes leave memory where those that the transaction has not changed take more than its share of
+  // SpaceOptions::cacheBytes, as its beginning and its end do too. Ends iterators and payload pointers where it returns true,
+  // and maps on the stack that have taken over nodes of the space; root maps keep their address. Changed and new nodes stay
+  // until the commit. Costs a visit of all nodes in memory where it does anything, at most once for each tenth of the share
+  // that was loaded. Without a budget it does nothing.
+  bool Trim() { return TrimTo(m_space.Allowance()); }
+  // The same, down to `bytes` instead; 0 has all unchanged nodes leave.
+  bool TrimTo(std::size_t bytes);
+  // Whether Trim would do anything. Cheap.
+  bool IsOverAllowance() const noexcept { return m_space.m_writerView.EvictableBytes() > m_space.Allowance(); }
+
   bool IsPoisoned() const noexcept { return m_poisoned; }
 
   // Of the host's side:
@@ -149,7 +161,7 @@ class WriteTransaction {
   void* MakeRoot(std::string_view name, const ClassEntry& classEntry);
 
   void DeleteResidents(ptr<IPersistable> root, std::vector<std::vector<OID>>& absent);
-  ptr<IPersistable> LoadForDeletion(OID oid);
+  void DeleteResidentsBelow(std::vector<OID> siblings, std::vector<std::vector<OID>>& absent);
   bool HasDirtyNodes() const noexcept;
 
   bool HasChanges() const noexcept;
@@ -164,6 +176,7 @@ class WriteTransaction {
   void RequireOwn(ptr<const IPersistable> object) const;
 
   CSpace& m_space;
+  UseCheck m_use;
   std::unique_lock<std::timed_mutex> m_processLock;
   std::unique_ptr<WriterLock> m_engineLock;
   bool m_open = false;

@@ -1,10 +1,10 @@
 #include "store/verify.h"
 
-#include <unordered_set>
-
 #include "platform/error.h"
 #include "store/commit_builder.h"
+#include "store/decoded_object.h"
 #include "store/envelope.h"
+#include "store/id_set.h"
 #include "store/map_check.h"
 #include "vxOperation/src/WorkingSet/CompOp/VectorOT.h"
 
@@ -54,7 +54,7 @@ class SpaceCheck {
   void CheckRoot(const std::string& name) {
     try {
       const ptr<IPersistable> map = m_snapshot.RootMap(name);
-      m_reached.insert(PersistStateOf(map).m_oid);
+      m_reached.Insert(PersistStateOf(map).m_oid);
       ++m_report.maps;
       CheckMapOfClass<FieldIdToVectorInsertionsMap>(name, map);
       CheckMapOfClass<FieldIdToVectorTombstonesMap>(name, map);
@@ -70,26 +70,24 @@ class SpaceCheck {
   void CheckMapOfClass(const std::string& name, ptr<IPersistable> object) {
     if (object.Table() != IPersistable::Stubs<Map>::GetTable()) return;
     const auto& map = *static_cast<const Map*>(object.m_self);
-    MapCheck<Map> check(map);
-    const std::vector<MapFinding> findings = check.Run();
-    for (const MapFinding& finding : findings) Find(name, finding.oid, finding.where + ": " + finding.fault);
-    if (findings.empty()) map.Validate();
-    for (const OID oid : check.Visited()) {
-      if (!m_reached.insert(oid).second) Find(name, oid, "the node belongs to two maps");
-    }
+    const auto reach = [&](OID oid) {
+      if (!m_reached.Insert(oid)) Find(name, oid, "the node belongs to two maps");
+    };
+    MapCheck<Map, NodeReader> check(map, NodeReader(m_snapshot), reach);
+    for (const MapFinding& finding : check.Run()) Find(name, finding.oid, finding.where + ": " + finding.fault);
     m_report.entries += static_cast<std::uint64_t>(map.m_size);
-    m_report.nodes += check.Visited().size();
+    m_report.nodes += check.NumVisited();
   }
 
   // The records that no root reaches: what hangs below the queue of deletions is on its way out, the rest is to be collected.
   void CheckRecords() {
     std::uint64_t total = 0;
     State().ScanRecords(OID(1), [&](OID, ByteView) { return ++total > 0; });
-    std::unordered_set<OID> awaitingDeletion = ReadQueue();
+    const IdSet awaitingDeletion = ReadQueue();
     State().ScanRecords(OID(1), [&](OID oid, ByteView record) {
-      if (!m_reached.contains(oid)) {
-        if (const ptr<IPersistable> object = CheckForm(oid, record); object.m_self != nullptr) DestroyObject(object);
-        if (!awaitingDeletion.contains(oid)) ++m_report.unreachable;
+      if (!m_reached.Contains(oid)) {
+        CheckForm(oid, record);
+        if (!awaitingDeletion.Contains(oid)) ++m_report.unreachable;
       }
       ++m_report.records;
       if (m_progress) m_progress(m_report.records, total);
@@ -98,28 +96,27 @@ class SpaceCheck {
   }
 
   // The queued objects and all that they own.
-  std::unordered_set<OID> ReadQueue() {
-    std::unordered_set<OID> ids;
+  IdSet ReadQueue() {
+    IdSet ids;
     std::vector<OID> pending = State().QueuedDeletions(SIZE_MAX);
     while (!pending.empty()) {
       const OID oid = pending.back();
       pending.pop_back();
       const std::optional<ByteView> record = State().Read(oid);
-      if (!record || !ids.insert(oid).second) continue;
-      if (const ptr<IPersistable> object = CheckForm(oid, *record); object.m_self != nullptr) {
-        for (const prefbase& child : OwnedReferences(object)) pending.push_back(child.m_oid);
-        DestroyObject(object);
-      }
+      if (!record || !ids.Insert(oid)) continue;
+      const DecodedObject object = CheckForm(oid, *record);
+      if (object.Get().m_self == nullptr) continue;
+      for (const prefbase& child : OwnedReferences(object.Get())) pending.push_back(child.m_oid);
     }
     return ids;
   }
 
-  // The object of a record, or null after a finding; the caller destroys it.
-  ptr<IPersistable> CheckForm(OID oid, ByteView record) {
+  // The object of a record, or nothing after a finding.
+  DecodedObject CheckForm(OID oid, ByteView record) {
     try {
-      return m_snapshot.Objects().Decode(oid, record);
+      return DecodedObject(m_snapshot.Objects().Decode(oid, record));
     } catch (const CorruptRecord& corrupt) {
-      if (m_faulty.insert(oid).second) Find("", oid, corrupt.what());
+      if (m_faulty.Insert(oid)) Find("", oid, corrupt.what());
       return {};
     }
   }
@@ -127,8 +124,8 @@ class SpaceCheck {
   Snapshot& m_snapshot;
   const std::function<void(std::uint64_t, std::uint64_t)>& m_progress;
   VerifyReport m_report;
-  std::unordered_set<OID> m_reached;
-  std::unordered_set<OID> m_faulty;  // unreached records that were found damaged
+  IdSet m_reached;
+  IdSet m_faulty;  // unreached records that were found damaged
 };
 
 }  // namespace

@@ -2,7 +2,6 @@
 
 #include <algorithm>
 #include <charconv>
-#include <unordered_set>
 #include <utility>
 
 #include "platform/error.h"
@@ -26,19 +25,18 @@ class ReadingScope {
   View* m_outer;
 };
 
-// Takes references to some objects back to the unbound state.
 class UnbindVisitor : public IObjectVisitor {
  public:
-  UnbindVisitor(const std::unordered_set<OID>& gone, const View* view) : m_gone(gone), m_view(view) {}
+  UnbindVisitor(const IdSet& ids, const View* view) : m_ids(ids), m_view(view) {}
   void VisitObject(ptr<const IObject>) override {}
   void VisitEvictableObject(const prefbase& reference) override {
-    if (!m_gone.contains(reference.m_oid)) return;
+    if (reference.m_ptr.m_self == nullptr || !m_ids.Contains(reference.m_oid)) return;
     reference.m_ptr.m_self = nullptr;
     reference.m_ptr.m_table = m_view;
   }
 
  private:
-  const std::unordered_set<OID>& m_gone;
+  const IdSet& m_ids;
   const View* m_view;
 };
 
@@ -90,8 +88,12 @@ Bytes EncodeRootValue(std::string_view name, const RootValue& value) {
   return SealNamed(NamedTable::kRoots, name, bytes);
 }
 
-View::View(CSpace& space, std::string spaceName, Kind kind)
-    : m_space(space), m_spaceName(std::move(spaceName)), m_kind(kind) {}
+View::View(CSpace& space, std::string spaceName, Kind kind, CacheCounters& counters, std::uint64_t seed)
+    : m_space(space),
+      m_spaceName(std::move(spaceName)),
+      m_kind(kind),
+      m_residents(counters, seed),
+      m_counters(counters) {}
 
 View::~View() {
   ForgetResidents();
@@ -131,25 +133,48 @@ void View::MoveTo(std::unique_ptr<EngineSnapshot> state) {
     return;
   }
   std::vector<OID> changed;
-  for (const auto& [oid, resident] : m_residents) {
+  IdSet gone;
+  for (const auto& [oid, resident] : m_residents.All()) {
     const std::optional<ByteView> record = state->Read(oid);
-    if (!record || CommitOfRecord(*record) != resident.commit) changed.push_back(oid);
+    if (record && CommitOfRecord(*record) == resident.commit) continue;
+    changed.push_back(oid);
+    gone.Insert(oid);
   }
-  std::unordered_set<OID> gone(changed.begin(), changed.end());
   m_state = std::move(state);
   m_generation = m_state->Generation();
   for (const OID oid : changed) {
     DestroyObject(Find(oid));
     Release(oid);
   }
-  UnbindVisitor unbind(gone, this);
-  for (const auto& [oid, resident] : m_residents) {
-    resident.object.Table()->_IObject.VisitObjects(resident.object.m_self, unbind);
-  }
+  Unbind(gone);
   for (auto& [name, root] : m_roots) ResetInPlace(root);
   m_rootsAreStale = true;
   ReadClassNumbers();
   ReloadRoots();
+}
+
+void View::Unbind(const IdSet& ids) const {
+  UnbindVisitor visitor(ids, this);
+  const auto visit = [&visitor](ptr<const IPersistable> object) {
+    object.Table()->_IObject.VisitObjects(object.m_self, visitor);
+  };
+  for (const auto& [oid, resident] : m_residents.All()) visit(resident.object);
+  for (const auto& [name, root] : m_roots) visit(root.map);
+  for (const Root& root : m_retiredRoots) visit(root.map);
+}
+
+bool View::Trim(std::size_t allowance) {
+  if (m_residents.EvictableBytes() <= allowance) return false;
+  const Residents::Choice choice = m_residents.Choose(allowance);
+  Unbind(choice.unbound);
+  for (const OID oid : choice.leaving) {
+    const ptr<IPersistable> object = Find(oid);
+    Release(oid);
+    DestroyObject(object);
+  }
+  CacheCounters::Add(m_counters.evictions, choice.leaving.size());
+  CacheCounters::Add(m_counters.passes, 1);
+  return true;
 }
 
 std::string View::Describe(OID oid, std::string_view className, std::string_view reason) const {
@@ -164,10 +189,7 @@ ErrorPlace View::Place(OID oid, std::string_view className, std::string_view roo
 
 // --- Objects ---
 
-ptr<IPersistable> View::Find(OID oid) const noexcept {
-  const auto found = m_residents.find(oid);
-  return found == m_residents.end() ? ptr<IPersistable>() : found->second.object;
-}
+ptr<IPersistable> View::Find(OID oid) const noexcept { return m_residents.Find(oid); }
 
 void View::Own(ptr<IPersistable> object, OID oid) noexcept {
   ObjSysState& state = SysStateOf(object);
@@ -185,18 +207,19 @@ bool View::Holds(OID oid, const void* self) const {
 void View::Adopt(OID oid, ptr<IPersistable> object, std::uint64_t commit) {
   {
     const std::lock_guard lock(m_tablesMutex);
-    m_residents.emplace(oid, Resident{object, commit});
+    m_residents.Add(oid, object, commit);
   }
   Own(object, oid);
 }
 
 void View::Release(OID oid) noexcept {
   const std::lock_guard lock(m_tablesMutex);
-  m_residents.erase(oid);
+  m_residents.Remove(oid);
 }
 
 ptr<IPersistable> View::Resolve(OID oid, const IPersistable::FnTable* expected) {
-  ptr<IPersistable> object = Find(oid);
+  const UseCheck::Scope use(m_use, m_spaceName, UseName());
+  ptr<IPersistable> object = m_residents.Use(oid);
   if (object.m_self == nullptr) {
     const std::optional<ByteView> record = State().Read(oid);
     if (!record) {
@@ -210,15 +233,19 @@ ptr<IPersistable> View::Resolve(OID oid, const IPersistable::FnTable* expected) 
       DestroyObject(object);
       throw;
     }
+    CacheCounters::Add(m_counters.loads, 1);
   }
-  if (expected != nullptr && object.Table() != expected) {
-    const ClassEntry* wanted = FindClass(expected);
-    throw CorruptRecord(Describe(oid, FindClass(object.Table())->Name(),
-                                 "a " + std::string(wanted != nullptr ? wanted->Name() : "different class") +
-                                     " should stand here (run vemo verify)"),
-                        Place(oid, FindClass(object.Table())->Name()));
-  }
+  if (expected != nullptr && object.Table() != expected) RefuseClass(oid, object.Table(), expected);
   return object;
+}
+
+void View::RefuseClass(OID oid, const IPersistable::FnTable* found, const IPersistable::FnTable* expected) const {
+  const ClassEntry* wanted = FindClass(expected);
+  const std::string_view className = FindClass(found)->Name();
+  throw CorruptRecord(Describe(oid, className,
+                               "a " + std::string(wanted != nullptr ? wanted->Name() : "different class") +
+                                   " should stand here (run vemo verify)"),
+                      Place(oid, className));
 }
 
 ptr<IPersistable> View::Decode(OID oid, ByteView record) {
@@ -389,10 +416,10 @@ void View::ResetInPlace(Root& root) noexcept {
 }
 
 void View::ForgetResidents() noexcept {
-  std::unordered_map<OID, Resident> forgotten;
+  Residents::Table forgotten;
   {
     const std::lock_guard lock(m_tablesMutex);
-    forgotten.swap(m_residents);
+    forgotten = m_residents.TakeAll();
   }
   for (const auto& [oid, resident] : forgotten) DestroyObject(resident.object);
   for (auto& [name, root] : m_roots) {

@@ -4,9 +4,9 @@
 //        [made] ------------> new --------------------+
 //                              |                      v       MarkDirty
 //   [stored] -- Resolve ---------------------------> clean <------------> dirty
-//                              |                      |    (commit)         |
-//                              |    Release           |                     |
-//                              +-----------+----------+---------------------+
+//        ^                     |                      |    (commit)         |
+//        |                     |    Release           |                     |
+//        +--- Trim (clean)     +-----------+----------+---------------------+
 //                                          v
 //                                    on the way out -- DestroyObject --> [gone]
 //
@@ -15,6 +15,9 @@
 //   V2. A reference that was read in the view and is not bound carries the view's address, so that it resolves here
 //       whatever else its thread has open.
 //   V3. Nothing in the view is newer than its commit, unless it is the writer's view inside a transaction.
+//
+// Threads: one at a time, and the writer's inside a transaction by its thread alone. Resolve refuses anything else that it
+// finds out; Holds is for any thread.
 #pragma once
 
 #include <cstdint>
@@ -24,11 +27,12 @@
 #include <mutex>
 #include <string>
 #include <string_view>
-#include <unordered_map>
 #include <vector>
 
 #include "store/class_registry.h"
 #include "store/engine.h"
+#include "store/residents.h"
+#include "store/use_check.h"
 #include "vxPersistStore/pref.h"
 
 namespace vemo {
@@ -62,7 +66,8 @@ class View {
     bool committed = false;
   };
 
-  View(CSpace& space, std::string spaceName, Kind kind);
+  // Counts for `counters`, and takes the random choice of what leaves memory from `seed` on.
+  View(CSpace& space, std::string spaceName, Kind kind, CacheCounters& counters, std::uint64_t seed);
   ~View();
   View(const View&) = delete;
   View& operator=(const View&) = delete;
@@ -88,6 +93,9 @@ class View {
   // table is not `expected` (null: any of the nine classes).
   ptr<IPersistable> Resolve(OID oid, const IPersistable::FnTable* expected);
 
+  // Throws CorruptRecord: the object's table is `found`, which is not `expected`.
+  [[noreturn]] void RefuseClass(OID oid, const IPersistable::FnTable* found, const IPersistable::FnTable* expected) const;
+
   // Checks a record and reads it into a fresh object that belongs to nobody yet; its references carry this view.
   ptr<IPersistable> Decode(OID oid, ByteView record);
 
@@ -99,6 +107,21 @@ class View {
   void Adopt(OID oid, ptr<IPersistable> object, std::uint64_t commit = 0);
   // Removes a resident without ending it.
   void Release(OID oid) noexcept;
+  // A resident was marked, or was written by that commit.
+  void MarkedDirty(OID oid) noexcept { m_residents.MarkedDirty(oid); }
+  void Written(OID oid, std::uint64_t commit) noexcept { m_residents.Written(oid, commit); }
+
+  // What the residents take that nothing pins.
+  std::size_t EvictableBytes() const noexcept { return m_residents.EvictableBytes(); }
+  // Ends clean residents until they take no more than `allowance` bytes. Nobody may hold a pointer to one of them, nor a
+  // reference outside the view's objects that is bound to one. Costs a visit of all residents where there is something to
+  // do; throws std::bad_alloc, which leaves everything as it was. Returns whether it did anything.
+  bool Trim(std::size_t allowance);
+
+  // Who may use the view.
+  UseCheck& Use() noexcept { return m_use; }
+  const UseCheck& Use() const noexcept { return m_use; }
+  const char* UseName() const noexcept { return m_kind == Kind::kSnapshot ? "the snapshot" : "the transaction"; }
 
   // The root of that name, its map read if need be; null when the space has none.
   Root* FindRoot(std::string_view name);
@@ -132,11 +155,8 @@ class View {
   void ReadClassNumbers();
   void ReadRoot(std::string_view name, Root& root);
   void Own(ptr<IPersistable> object, OID oid) noexcept;
-
-  struct Resident {
-    ptr<IPersistable> object;
-    std::uint64_t commit;
-  };
+  // Takes all references of the view to these objects back to the unbound state.
+  void Unbind(const IdSet& ids) const;
 
   CSpace& m_space;
   std::string m_spaceName;
@@ -147,7 +167,9 @@ class View {
   bool m_rootsAreStale = false;
   std::vector<const ClassEntry*> m_classes;  // number - 1 -> class; null where this program does not know it
   mutable std::mutex m_tablesMutex;  // held where the residents or the roots change, for Holds
-  std::unordered_map<OID, Resident> m_residents;
+  Residents m_residents;
+  UseCheck m_use;
+  CacheCounters& m_counters;
   std::map<std::string, Root, std::less<>> m_roots;
   std::vector<Root> m_retiredRoots;  // maps whose name now stands for another class
 };

@@ -4,29 +4,25 @@
 
 #include "platform/error.h"
 #include "platform/xostream.h"
-#include "store/snapshot.h"
+#include "store/dump.h"
+#include "tool/cache_option.h"
 #include "tool/commands.h"
-#include "vxOperation/src/WorkingSet/CompOp/VectorOT.h"
 
 namespace vemo::tool {
 
 namespace {
 
-// Writes the map if it is of this class.
-template <class Map>
-bool WriteIfOfClass(ptr<IPersistable> object, xostream& os) {
-  if (object.Table() != IPersistable::Stubs<Map>::GetTable()) return false;
-  static_cast<const Map*>(object.m_self)->Write(os);
-  return true;
-}
+struct DumpArguments {
+  std::string store;
+  std::string map;
+  std::optional<std::uint64_t> cacheBytes;
+};
 
-ExitCode RunDump(const std::string& store, const std::string& name) {
-  const auto space = CSpace::Open(store);
+ExitCode RunDump(const DumpArguments& arguments) {
+  const auto space = CSpace::Open(arguments.store, {.cacheBytes = arguments.cacheBytes});
   Snapshot snapshot(*space);
-  const ptr<IPersistable> map = snapshot.RootMap(name);
   xostream os(std::cout);
-  WriteIfOfClass<FieldIdToVectorInsertionsMap>(map, os) || WriteIfOfClass<FieldIdToVectorTombstonesMap>(map, os) ||
-      WriteIfOfClass<FieldIdToVectorInsertionsAndDeletionsMap>(map, os);
+  DumpMap(snapshot, arguments.map, os);
   std::cout.flush();
   if (!std::cout) throw StoreError("the dump could not be written to standard output");
   return kGood;
@@ -35,18 +31,13 @@ ExitCode RunDump(const std::string& store, const std::string& name) {
 }  // namespace
 
 void AddDumpCommand(CLI::App& app, Command& chosen) {
-  struct Arguments {
-    std::string store;
-    std::string map;
-  };
-  auto arguments = std::make_shared<Arguments>();
+  auto arguments = std::make_shared<DumpArguments>();
   CLI::App* command = app.add_subcommand("dump", "Print a root map as text");
   command->add_option("store", arguments->store, "The space: lmdb:PATH")->required();
   command->add_option("map", arguments->map, "The name of the root map, such as insertions")->required();
+  AddCacheOption(*command, arguments->cacheBytes);
   command->footer("Example:\n  vemo dump lmdb:/tmp/history tombstones");
-  command->callback([arguments, &chosen] {
-    chosen = [arguments] { return RunDump(arguments->store, arguments->map); };
-  });
+  command->callback([arguments, &chosen] { chosen = [arguments] { return RunDump(*arguments); }; });
 }
 
 }  // namespace vemo::tool

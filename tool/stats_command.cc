@@ -8,6 +8,7 @@
 
 #include "history/source_error.h"
 #include "store/statistics.h"
+#include "tool/cache_option.h"
 #include "tool/commands.h"
 #include "tool/numbers.h"
 #include "tool/progress_bar.h"
@@ -21,6 +22,7 @@ using Json = nlohmann::ordered_json;
 struct StatsArguments {
   std::string store;
   bool json = false;
+  std::optional<std::uint64_t> cacheBytes;
 };
 
 // The other processes that have a snapshot open.
@@ -130,7 +132,7 @@ std::string MapText(const MapStatistics& map) {
 }
 
 ExitCode RunStats(const StatsArguments& arguments) {
-  const auto space = CSpace::Open(arguments.store);
+  const auto space = CSpace::Open(arguments.store, {.cacheBytes = arguments.cacheBytes});
   Snapshot snapshot(*space);
   SpaceStatistics statistics;
   {
@@ -154,6 +156,7 @@ void AddStatsCommand(CLI::App& app, Command& chosen) {
   CLI::App* command = app.add_subcommand("stats", "Print how large the space and its maps are, and how full");
   command->add_option("store", arguments->store, "The space: lmdb:PATH")->required();
   command->add_flag("--json", arguments->json, "Print a JSON object instead of tables");
+  AddCacheOption(*command, arguments->cacheBytes);
   command->footer(
       "Level 0 is the leaves. Fill is the share of a node's capacity: of the emptiest node, the mean, of the "
       "fullest.\n"

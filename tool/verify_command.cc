@@ -8,6 +8,7 @@
 #include "store/raw_check.h"
 #include "store/reading_engine.h"
 #include "store/verify.h"
+#include "tool/cache_option.h"
 #include "tool/commands.h"
 #include "tool/numbers.h"
 #include "tool/progress_bar.h"
@@ -21,8 +22,14 @@ void PrintFinding(const Finding& finding) {
              finding.oid.IsNull() ? "" : fmt::format("object {}: ", finding.oid.m_value), OneLine(finding.fault));
 }
 
-ExitCode RunVerify(const std::string& store) {
-  const auto space = CSpace::Open(store);
+struct VerifyArguments {
+  std::string store;
+  bool raw = false;
+  std::optional<std::uint64_t> cacheBytes;
+};
+
+ExitCode RunVerify(const VerifyArguments& arguments) {
+  const auto space = CSpace::Open(arguments.store, {.cacheBytes = arguments.cacheBytes});
   Snapshot snapshot(*space);
   VerifyReport report;
   {
@@ -62,15 +69,15 @@ ExitCode RunRawVerify(const std::string& store) {
 }  // namespace
 
 void AddVerifyCommand(CLI::App& app, Command& chosen) {
-  auto store = std::make_shared<std::string>();
+  auto arguments = std::make_shared<VerifyArguments>();
   CLI::App* command =
       app.add_subcommand("verify", "Check checksums, every map's structure and that the maps agree with one another");
-  command->add_option("store", *store, "The space: lmdb:PATH")->required();
-  auto raw = std::make_shared<bool>(false);
-  command->add_flag("--raw", *raw, "Check the stored bytes with a reader of their own, also where the space cannot be opened");
+  command->add_option("store", arguments->store, "The space: lmdb:PATH")->required();
+  command->add_flag("--raw", arguments->raw, "Check the stored bytes with a reader of their own, also where the space cannot be opened");
+  AddCacheOption(*command, arguments->cacheBytes);
   command->footer("Example:\n  vemo verify lmdb:/tmp/history");
-  command->callback([store, raw, &chosen] {
-    chosen = [store, raw] { return *raw ? RunRawVerify(*store) : RunVerify(*store); };
+  command->callback([arguments, &chosen] {
+    chosen = [arguments] { return arguments->raw ? RunRawVerify(arguments->store) : RunVerify(*arguments); };
   });
 }
 

@@ -3,6 +3,8 @@
 
 #include <gtest/gtest.h>
 
+#include <set>
+
 #include "store/transaction.h"
 #include "tests/support/keys.h"
 #include "tests/support/production_payloads.h"
@@ -72,10 +74,12 @@ TEST(MapCheckOfAnySizeTest, FindsNothingInSoundTrees) {
 }
 
 TEST_F(MapCheckTest, VisitsEveryNode) {
-  MapCheck<Map> check(m_tree.map());
+  std::set<OID> reached;
+  MapCheck<Map> check(m_tree.map(), {}, [&reached](OID oid) { reached.insert(oid); });
   check.Run();
-  EXPECT_EQ(check.Visited().size(), 4u);
-  EXPECT_TRUE(check.Visited().contains(m_tree.map().m_root.m_oid));
+  EXPECT_EQ(check.NumVisited(), 4u);
+  EXPECT_EQ(reached.size(), 4u);
+  EXPECT_TRUE(reached.contains(m_tree.map().m_root.m_oid));
 }
 
 TEST_F(MapCheckTest, FindsAWrongSize) {

@@ -55,6 +55,8 @@ TEST_P(DeletionTest, NodesThatWereMergedAwayLeaveAtThatCommit) {
 }
 
 TEST_P(DeletionTest, TheNodesOfAClearedMapInMemoryLeaveAtThatCommit) {
+  site.Close();
+  site.Open({.create = true, .cacheBytes = 10'000'000});  // so that nodes stay in memory between transactions
   CommitFilled<TombstonesMap>(space(), "t", 3000);
   WriteTransaction transaction(space());
   transaction.Root<TombstonesMap>("t").clear();

@@ -29,6 +29,8 @@ TEST_P(RefreshTest, ShowsTheNewestCommitInTheSameMap) {
 }
 
 TEST_P(RefreshTest, KeepsNodesThatDidNotChangeInMemory) {
+  site.Close();
+  site.Open({.create = true, .cacheBytes = 10'000'000});
   CommitFilled<TombstonesMap>(space(), "t", 5000);
   Snapshot snapshot(space());
   const auto& map = snapshot.Root<TombstonesMap>("t");

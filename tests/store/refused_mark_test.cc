@@ -58,6 +58,8 @@ void ForEachChange(Act&& act) {
 }
 
 TEST_P(RefusedMarkTest, ChangingARootOutsideATransactionThrowsAndTheNextOneSeesTheCommittedState) {
+  site.Close();
+  site.Open({.create = true, .cacheBytes = 10'000'000});  // so that nodes stay in memory between transactions
   ForEachChange([&](const auto& change) {
     auto& map = RootOutsideATransaction();
     const std::string message = MessageOf<UsageError>([&] { change(map); });

@@ -157,8 +157,9 @@ TEST_F(LmdbSpaceOpen, TheOptionsInForceAreToldAsText) {
   const auto space =
       CSpace::Open(Uri("?map_bytes=16777216"), {.create = true, .writerTimeout = std::chrono::seconds(3)});
   EXPECT_EQ(space->OptionsText(),
-            "lmdb:" + path.string() + "?sync=commit&map_bytes=16777216 create=yes writer_timeout_ms=3000 reader_warning_age_ms=none reader_max_age_ms=none");
-  EXPECT_EQ(CSpace::Open("memory:")->OptionsText(), "memory: create=no writer_timeout_ms=10000 reader_warning_age_ms=none reader_max_age_ms=none");
+            "lmdb:" + path.string() + "?sync=commit&map_bytes=16777216 create=yes writer_timeout_ms=3000 reader_warning_age_ms=none reader_max_age_ms=none cache_bytes=none");
+  EXPECT_NE(CSpace::Open("memory:", {.cacheBytes = 4096})->OptionsText().find(" cache_bytes=4096"), std::string::npos);
+  EXPECT_EQ(CSpace::Open("memory:")->OptionsText(), "memory: create=no writer_timeout_ms=10000 reader_warning_age_ms=none reader_max_age_ms=none cache_bytes=none");
 }
 
 TEST_F(LmdbSpaceOpen, ASpaceGrowsBeyondItsMapByItself) {

@@ -54,6 +54,8 @@ TEST_P(StackMapTest, SwappedIntoARootItsNodesAreKept) {
 }
 
 TEST_P(StackMapTest, TheOldTreeOfASwappedRootCanBeClearedThroughTheStack) {
+  site.Close();
+  site.Open({.create = true, .cacheBytes = 10'000'000});  // so that nodes stay in memory between transactions
   CommitFilled<TombstonesMap>(space(), "t", 300);
   WriteTransaction transaction(space());
   TombstonesMap stack;

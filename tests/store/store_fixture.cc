@@ -24,7 +24,7 @@ std::map<std::string, Bytes> NamedValues(const EngineSnapshot& state, NamedTable
 }  // namespace
 
 void PrintTo(EngineKind kind, std::ostream* os) {
-  *os << (kind == EngineKind::kMemory ? "memory" : "lmdb");
+  *os << (IsLmdb(kind) ? "lmdb" : "memory") << (Evicts(kind) ? "_evicting" : "");
 }
 
 std::string EngineKindName(const testing::TestParamInfo<EngineKind>& info) {
@@ -52,8 +52,9 @@ StoredState StoredStateOf(Engine& engine) {
   return state;
 }
 
-void SpaceSite::Open(const SpaceOptions& options) {
-  if (m_kind == EngineKind::kLmdb) {
+void SpaceSite::Open(SpaceOptions options) {
+  if (Evicts(m_kind) && !options.cacheBytes) options.cacheBytes = 0;
+  if (IsLmdb(m_kind)) {
     LmdbOptions lmdb;
     lmdb.path = m_folder.path() / "space";
     lmdb.create = true;
@@ -67,7 +68,7 @@ void SpaceSite::Open(const SpaceOptions& options) {
 
 void SpaceSite::Close() {
   m_space.reset();
-  if (m_kind == EngineKind::kLmdb) m_engine.reset();
+  if (IsLmdb(m_kind)) m_engine.reset();
 }
 
 void SpaceSite::CommitBehind(CommitBatch& batch) {

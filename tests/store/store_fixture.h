@@ -27,7 +27,10 @@ using InsertionsMap = FieldIdToVectorInsertionsMap;
 using TombstonesMap = FieldIdToVectorTombstonesMap;
 using HistoriesMap = FieldIdToVectorInsertionsAndDeletionsMap;
 
-enum class EngineKind { kMemory, kLmdb };
+// The engine of a space, and with an evicting kind, that no unchanged node stays in memory from one transaction to the next.
+enum class EngineKind { kMemory, kLmdb, kMemoryEvicting, kLmdbEvicting };
+constexpr bool IsLmdb(EngineKind kind) { return kind == EngineKind::kLmdb || kind == EngineKind::kLmdbEvicting; }
+constexpr bool Evicts(EngineKind kind) { return kind == EngineKind::kMemoryEvicting || kind == EngineKind::kLmdbEvicting; }
 void PrintTo(EngineKind kind, std::ostream* os);
 
 // All that an engine holds.
@@ -57,7 +60,8 @@ class SpaceSite {
   Engine& engine() { return *m_engine; }
   EngineWatch& watch() { return m_watch; }
 
-  void Open(const SpaceOptions& options = {.create = true});
+  // An evicting kind opens it with a budget of no bytes, unless the options have one.
+  void Open(SpaceOptions options = {.create = true});
   void Close();
   void Reopen() {
     Close();
@@ -101,7 +105,9 @@ class StoreTest : public testing::TestWithParam<EngineKind> {
 std::string EngineKindName(const testing::TestParamInfo<EngineKind>& info);
 
 #define INSTANTIATE_STORE_TEST(fixture)                                                               \
-  INSTANTIATE_TEST_SUITE_P(Engines, fixture, testing::Values(EngineKind::kMemory, EngineKind::kLmdb), \
+  INSTANTIATE_TEST_SUITE_P(Engines, fixture,                                                          \
+                           testing::Values(EngineKind::kMemory, EngineKind::kLmdb,                    \
+                                           EngineKind::kMemoryEvicting, EngineKind::kLmdbEvicting),   \
                            EngineKindName)
 
 template <class Map>
@@ -161,9 +167,9 @@ std::string MessageOf(Act&& act) {
 // The nodes of a tree. Loads all of them.
 template <class Map>
 std::unordered_set<OID> NodeIds(const Map& map) {
-  MapCheck<Map> check(map);
-  check.Run();
-  return check.Visited();
+  std::unordered_set<OID> ids;
+  MapCheck<Map>(map, {}, [&ids](OID oid) { ids.insert(oid); }).Run();
+  return ids;
 }
 
 }  // namespace vemo::test

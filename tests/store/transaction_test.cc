@@ -177,7 +177,8 @@ TEST_P(TransactionTest, NothingCanBeDoneWithATransactionThatWasCommitted) {
 
 TEST_P(TransactionTest, ATransactionThatChangesNothingKeepsWhatIsInMemory) {
   CommitFilled<TombstonesMap>(space(), "t", 1000);
-  site.Reopen();
+  site.Close();
+  site.Open({.create = true, .cacheBytes = 1'000'000});
   const auto readAll = [&] {
     WriteTransaction transaction(space());
     EXPECT_EQ(NumbersOf(transaction.View<TombstonesMap>("t")).size(), 1000u);

@@ -86,6 +86,8 @@ TEST_P(WrittenRecordsTest, WhatDoesNotChangeIsNotWritten) {
 }
 
 TEST_P(WrittenRecordsTest, ALoopOverAMapThatIsNotConstantWritesEveryLeafAndNoOtherNode) {
+  site.Close();
+  site.Open({.create = true, .cacheBytes = 10'000'000});  // so that nodes stay in memory between transactions
   CommitFilled<TombstonesMap>(space(), "t", 1000);
   WriteTransaction transaction(space());
   auto& map = transaction.Root<TombstonesMap>("t");
