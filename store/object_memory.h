@@ -3,6 +3,7 @@
 
 #include <algorithm>
 #include <cstddef>
+#include <functional>
 
 #include "vxOperation/src/WorkingSet/CompOp/VectorOT.h"
 
@@ -19,8 +20,15 @@ inline std::size_t HeapBytesOf(const FieldId& key) noexcept {
   return key.path.size() > Path::kInlineCapacity ? HeapBytes(key.path.size() * sizeof(Path::Element)) : 0;
 }
 
+// A short buffer lies in the object itself.
+inline std::size_t HeapBytesOf(const VectorOfByte& buffer) noexcept {
+  const std::less<const void*> before;
+  const bool isInside = !before(buffer.data(), &buffer) && before(buffer.data(), &buffer + 1);
+  return isInside ? 0 : HeapBytes(static_cast<std::size_t>(buffer.capacity()));
+}
+
 inline std::size_t HeapBytesOf(const VectorTombstones& tombstones) noexcept {
-  return HeapBytes(static_cast<std::size_t>(tombstones.m_tombstones.m_buffer.capacity()));
+  return HeapBytesOf(tombstones.m_tombstones.m_buffer);
 }
 
 template <class T, class Base, bool owns>

@@ -9,7 +9,7 @@
 namespace vemo::test {
 
 inline constexpr std::uint64_t kCacheBytes = 100'000;
-inline constexpr std::uint64_t kKeysOfLargeMap = 75'000;  // in ascending order: nodes are half full
+inline constexpr std::uint64_t kKeysOfLargeMap = 100'000;  // in ascending order: nodes are half full
 // A path from the root with the neighbours that a deletion looks at: what one operation may load on top of the budget.
 inline constexpr std::uint64_t kOperationBytes = 12 * 10'000;
 
