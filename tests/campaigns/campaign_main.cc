@@ -86,6 +86,7 @@ Verdict SoakSpace(Numbers& numbers) {
   numbers.Take("operations", options.operations);
   numbers.Take("keys", options.keys);
   numbers.Take("commit", options.operationsPerCommit);
+  numbers.Take("cache", options.cacheBytes);
   numbers.RequireAllTaken();
   return RunSoak(options);
 }

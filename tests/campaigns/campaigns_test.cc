@@ -60,6 +60,7 @@ TEST(Campaigns, ASoakedMapStaysWhatItsModelIs) {
                        .operations = 200'000,
                        .keys = 8'000,
                        .operationsPerCommit = 4'000,
+                       .cacheBytes = 100'000,
                        .print = false}));
 }
 

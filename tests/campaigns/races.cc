@@ -54,6 +54,7 @@ class Races {
   void RunOn(const std::string& uri) {
     SpaceOptions options;
     options.create = true;
+    options.cacheBytes = m_options.cacheBytes;
     options.writerTimeout = std::chrono::hours(1);  // collection and the writer wait for one another
     m_space = CSpace::Open(uri, options);
     m_random.seed(m_options.seed);
@@ -88,6 +89,7 @@ class Races {
     m_verdict.Count("commits", m_options.commits);
     m_verdict.Count("collections", m_options.collections);
     m_verdict.Count("records collected", std::exchange(m_swept, 0));
+    m_verdict.Count("nodes left memory", m_space->CacheStatistics().evictions);
     m_verdict.Count("reads", m_options.reads * m_options.readers);
   }
 

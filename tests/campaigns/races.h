@@ -1,4 +1,5 @@
-// One writer, readers and collection on threads of their own: every reader sees one commit, as a whole.
+// One writer, readers and collection on threads of their own, with a cache that holds a part of the maps: every reader sees one
+// commit, as a whole.
 #pragma once
 
 #include <cstdint>
@@ -13,6 +14,7 @@ struct RacesOptions {
   std::uint64_t reads = 2'000;    // of each reader: of a snapshot's maps as a whole
   std::uint64_t readers = 4;
   std::uint64_t collections = 200;
+  std::uint64_t cacheBytes = 200'000;
   std::uint64_t keys = 2'000;
 };
 

@@ -62,6 +62,7 @@ class Soak {
     m_verdict.Count("operations", m_done);
     m_verdict.Count("commits", m_commits);
     m_verdict.Count("entries at the end", m_model.size());
+    m_verdict.Count("nodes left memory", m_evictions + m_space->CacheStatistics().evictions);
     if (m_options.operations >= 60 * m_options.keys) JudgeMemory();
     return m_verdict;
   }
@@ -69,8 +70,12 @@ class Soak {
  private:
   void Reopen() {
     m_reader.reset();
+    if (m_space != nullptr) m_evictions += m_space->CacheStatistics().evictions;
     m_space.reset();
-    m_space = CSpace::Open(m_uri, {.create = true});
+    SpaceOptions options;
+    options.create = true;
+    options.cacheBytes = m_options.cacheBytes;
+    m_space = CSpace::Open(m_uri, options);
   }
 
   void CommitSome() {
@@ -87,6 +92,7 @@ class Soak {
       const bool inserts = m_random() % 2 == 0;
       for (std::uint64_t i = 0; i < kRun; ++i) Operate(map, first + i, inserts);
       m_done += kRun;
+      transaction.Trim();
     }
     transaction.Commit();
   }
@@ -180,6 +186,7 @@ class Soak {
   Model m_model;
   std::uint64_t m_done = 0;
   std::uint64_t m_commits = 0;
+  std::uint64_t m_evictions = 0;
   std::vector<std::uint64_t> m_resident;
 };
 
