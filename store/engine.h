@@ -53,8 +53,15 @@ struct CommitBatch {
   std::vector<NamedValue> namedValues;
 };
 
+// Something wrong in what an engine keeps its values in.
+struct StorageFinding {
+  std::string what;                   // the fault and the file, table or structure that has it
+  std::optional<std::uint64_t> page;  // of the engine's file, where it has pages
+};
+
 // The state after one commit, whatever is committed meanwhile. What it returns stays valid until it is destroyed.
-// Every function throws StoreError when the engine fails.
+// Every function throws StoreError when the engine fails, and DamagedStorage when what it must read is damaged: that a
+// value is absent is an answer only where that is certain. The rest stays readable.
 class EngineSnapshot {
  public:
   virtual ~EngineSnapshot() = default;
@@ -75,6 +82,10 @@ class EngineSnapshot {
 
   // The first `limit` entries of the deletion queue in ascending order.
   virtual std::vector<OID> QueuedDeletions(std::size_t limit) const = 0;
+
+  // Checks all that the engine keeps this state in, apart from the values, which the store seals itself. Does not stop at
+  // the first fault. Reads every page; what has no pages has nothing to check.
+  virtual std::vector<StorageFinding> CheckStorage() const { return {}; }
 };
 
 // Held by the one process and transaction that may commit; released by the destructor, also when the process dies.

@@ -92,6 +92,27 @@ class CorruptRecord : public StoreError {
   std::error_code code() const noexcept override { return make_error_code(ErrorCode::kCorruptRecord); }
 };
 
+// What the engine keeps its values in is damaged: a page, an index, a file. The message names it.
+class DamagedStorage : public CorruptRecord {
+ public:
+  DamagedStorage(const std::string& message, ErrorPlace place) : CorruptRecord(message, std::move(place)) {}
+  DamagedStorage(const std::string& message, ErrorPlace place, std::string fault, std::uint64_t page, OID next)
+      : CorruptRecord(message, std::move(place)), m_fault(std::move(fault)), m_page(page), m_next(next) {}
+
+  // What is wrong, without the space and the advice; empty where no page is at fault, and then there is no page().
+  const std::string& fault() const noexcept { return m_fault; }
+  std::optional<std::uint64_t> page() const noexcept { return m_page; }
+
+  // Where records cannot be read for it: ScanRecords can go on at this id, behind the damage. Null where the damage
+  // concerns no records, or all that follow. oid() is the first id that cannot be read, or null where that is unknown.
+  OID next() const noexcept { return m_next; }
+
+ private:
+  std::string m_fault;
+  std::optional<std::uint64_t> m_page;
+  OID m_next;
+};
+
 // A reference names an object of which the space has no record.
 class DanglingReference : public CorruptRecord {
  public:

@@ -1,19 +1,20 @@
 #include "engines/lmdb/lmdb_engine.h"
 
-#include <lmdb.h>
 #include <sys/stat.h>
 
 #include <algorithm>
 #include <cerrno>
 #include <limits>
+#include <map>
+#include <string_view>
 #include <utility>
 
 #include "engines/batch_check.h"
-#include "engines/lmdb/big_endian.h"
 #include "engines/lmdb/lmdb_environment.h"
 #include "engines/lmdb/lmdb_error.h"
 #include "engines/lmdb/lmdb_snapshot.h"
 #include "engines/lmdb/lmdb_writer_lock.h"
+#include "engines/lmdb/space_writer.h"
 #include "platform/error.h"
 
 namespace vemo {
@@ -23,69 +24,30 @@ constexpr const char* kCommit = "commit to";
 constexpr const char* kReserve = "reserve ids in";
 constexpr const char* kLock = "lock for writing";
 
-// One write transaction's view of the tables, in the words of a batch.
-class BatchWriter {
- public:
-  BatchWriter(MDB_txn* txn, const LmdbEnvironment& environment)
-      : m_txn(txn), m_tables(environment.tables()), m_space(environment.name()) {}
-
-  void Apply(const CommitBatch& batch) {
-    const std::uint64_t generation = ReadGeneration(m_txn, m_tables, m_space);
-    if (generation != batch.expectedGeneration) throw StaleGeneration(batch.expectedGeneration, generation);
-    for (const OID oid : batch.removedRecords) RemoveId(m_tables.records, oid);
-    PutRecords(batch.records);
-    for (const OID oid : batch.finishedDeletions) RemoveId(m_tables.deletions, oid);
-    for (const OID oid : batch.queuedDeletions) PutId(m_tables.deletions, oid, {});
-    for (const CommitBatch::NamedValue& named : batch.namedValues) {
-      const unsigned table = TableOf(named.table, m_tables);
-      MDB_val key{named.name.size(), const_cast<char*>(named.name.data())};
-      if (named.value) {
-        Put(table, key, *named.value);
-      } else {
-        Remove(table, key);
-      }
-    }
-    WriteGeneration(m_txn, m_tables, generation + 1, m_space);
-  }
-
- private:
+void Apply(const CommitBatch& batch, SpaceWriter& writer) {
+  const std::uint64_t generation = writer.Numbers().generation;
+  if (generation != batch.expectedGeneration) throw StaleGeneration(batch.expectedGeneration, generation);
+  for (const OID oid : batch.removedRecords) writer.RemoveRecord(oid);
   // In the order of ids, so that neighbours are written while their page is at hand.
-  void PutRecords(const std::vector<CommitBatch::Record>& records) {
-    std::vector<const CommitBatch::Record*> sorted;
-    sorted.reserve(records.size());
-    for (const CommitBatch::Record& record : records) sorted.push_back(&record);
-    std::sort(sorted.begin(), sorted.end(), [](const auto* a, const auto* b) { return a->oid < b->oid; });
-    for (const CommitBatch::Record* record : sorted) PutId(m_tables.records, record->oid, record->bytes);
+  std::vector<const CommitBatch::Record*> sorted;
+  sorted.reserve(batch.records.size());
+  for (const CommitBatch::Record& record : batch.records) sorted.push_back(&record);
+  std::sort(sorted.begin(), sorted.end(), [](const auto* a, const auto* b) { return a->oid < b->oid; });
+  for (const CommitBatch::Record* record : sorted) writer.PutRecord(record->oid, record->bytes);
+  for (const OID oid : batch.finishedDeletions) writer.Unqueue(oid);
+  for (const OID oid : batch.queuedDeletions) writer.Queue(oid);
+  // Of a name that is there more than once the last value counts.
+  std::map<std::pair<NamedTable, std::string_view>, const std::optional<Bytes>*> named;
+  for (const CommitBatch::NamedValue& value : batch.namedValues) named[{value.table, value.name}] = &value.value;
+  for (const auto& [name, value] : named) {
+    if (*value) {
+      writer.PutNamed(name.first, name.second, **value);
+    } else {
+      writer.RemoveNamed(name.first, name.second);
+    }
   }
-
-  void PutId(unsigned table, OID oid, ByteView value) {
-    BigEndian64 bytes = ToBigEndian(oid.m_value);
-    MDB_val key{bytes.size(), bytes.data()};
-    Put(table, key, value);
-  }
-
-  void RemoveId(unsigned table, OID oid) {
-    BigEndian64 bytes = ToBigEndian(oid.m_value);
-    MDB_val key{bytes.size(), bytes.data()};
-    Remove(table, key);
-  }
-
-  void Put(unsigned table, MDB_val& key, ByteView value) {
-    static const std::uint8_t kNothing = 0;  // LMDB copies no byte of an empty value, but from a valid place
-    const std::uint8_t* data = value.empty() ? &kNothing : value.data();
-    MDB_val val{value.size(), const_cast<std::uint8_t*>(data)};
-    CheckLmdb(mdb_put(m_txn, table, &key, &val, 0), kCommit, m_space);
-  }
-
-  void Remove(unsigned table, MDB_val& key) {
-    const int code = mdb_del(m_txn, table, &key, nullptr);
-    if (code != MDB_NOTFOUND) CheckLmdb(code, kCommit, m_space);
-  }
-
-  MDB_txn* m_txn;
-  const LmdbTables& m_tables;
-  const std::string& m_space;
-};
+  writer.PutGeneration(generation + 1);
+}
 
 class LmdbEngine final : public Engine {
  public:
@@ -100,21 +62,20 @@ class LmdbEngine final : public Engine {
 
   std::uint64_t Commit(const CommitBatch& batch) override {
     CheckBatch(batch);
-    m_environment->Write(kCommit, [&](MDB_txn* txn) { BatchWriter(txn, *m_environment).Apply(batch); });
+    m_environment->Write(kCommit, [&](SpaceWriter& writer) { Apply(batch, writer); });
     return batch.expectedGeneration + 1;
   }
 
   OID ReserveIds(std::uint64_t count) override {
     if (count == 0) throw UsageError(Name() + ": at least one id must be reserved");
     OID first;
-    m_environment->Write(kReserve, [&](MDB_txn* txn) {
-      const LmdbTables& tables = m_environment->tables();
-      const std::uint64_t next = ReadNextId(txn, tables, Name());
+    m_environment->Write(kReserve, [&](SpaceWriter& writer) {
+      const std::uint64_t next = writer.Numbers().nextId;
       if (count > std::numeric_limits<std::uint64_t>::max() - next) {
         throw StoreError(Name() + ": " + std::to_string(count) +
                          " more ids do not exist: the last is 2^64 - 2");
       }
-      WriteNextId(txn, tables, next + count, Name());
+      writer.PutNextId(next + count);
       first = OID(next);
     });
     return first;

@@ -12,7 +12,9 @@
 #include <set>
 #include <sstream>
 
+#include "engines/fork_count.h"
 #include "engines/lmdb/lmdb_error.h"
+#include "engines/lmdb/space_writer.h"
 #include "platform/error.h"
 
 namespace vemo {
@@ -29,8 +31,15 @@ struct AbortTransaction {
 };
 using Transaction = std::unique_ptr<MDB_txn, AbortTransaction>;
 
-struct CloseEnvironment {
-  void operator()(MDB_env* env) const noexcept { mdb_env_close(env); }
+class CommitLock {
+ public:
+  explicit CommitLock(SealedSpace& sealed) : m_sealed(sealed) { m_sealed.LockCommits(); }
+  ~CommitLock() { m_sealed.UnlockCommits(); }
+  CommitLock(const CommitLock&) = delete;
+  CommitLock& operator=(const CommitLock&) = delete;
+
+ private:
+  SealedSpace& m_sealed;
 };
 
 Transaction Begin(MDB_env* env, unsigned flags, const char* operation, const std::string& space) {
@@ -39,12 +48,12 @@ Transaction Begin(MDB_env* env, unsigned flags, const char* operation, const std
   return Transaction(txn);
 }
 
-// The address space to ask for first: where the process has a limit, half of it is left to others.
+// The address space to ask for first: where the process has a limit, half of it is left to others, and the file is mapped twice.
 std::size_t FirstMapBytes() {
   rlimit limit{};
   if (::getrlimit(RLIMIT_AS, &limit) != 0 || limit.rlim_cur == RLIM_INFINITY) return kPreferredMapBytes;
-  const std::size_t half = std::bit_floor(static_cast<std::size_t>(limit.rlim_cur) / 2);
-  return std::clamp(half, kSmallestMapBytes, kPreferredMapBytes);
+  const std::size_t quarter = std::bit_floor(static_cast<std::size_t>(limit.rlim_cur) / 4);
+  return std::clamp(quarter, kSmallestMapBytes, kPreferredMapBytes);
 }
 
 std::size_t RoundUpToPages(std::uint64_t bytes) {
@@ -73,7 +82,8 @@ LmdbEnvironment::LmdbEnvironment(const LmdbOptions& options)
     : m_options(options),
       m_name("lmdb:" + options.path.string()),
       m_path(std::filesystem::absolute(options.path)),
-      m_process(::getpid()) {
+      m_process(::getpid()),
+      m_forks(ForkCount()) {
   if (options.create && options.readOnly) {
     throw UsageError("cannot open " + m_name + ": a space cannot be created read-only");
   }
@@ -104,7 +114,7 @@ LmdbEnvironment::~LmdbEnvironment() {
 }
 
 bool LmdbEnvironment::IsOwnProcess() const noexcept {
-  return ::getpid() == m_process;
+  return ForkCount() == m_forks;
 }
 
 void LmdbEnvironment::RequireOwnProcess(const char* operation) const {
@@ -119,22 +129,33 @@ void LmdbEnvironment::RequireWritable(const char* operation) const {
                    ": it was opened read-only; open it for writing");
 }
 
-// Opening a file with its lock makes lock.mdb before LMDB looks at the file, so what is not a space is found
-// out here, without a lock. Without one the tables may be read only while nobody can be writing: before
-// lock.mdb exists.
+// What LMDB takes on trust when it opens a file.
+void LmdbEnvironment::RequireSoundHeader(PageFile& file) const {
+  const HeaderFault header = FaultOfHeader(file);
+  if (header.fault.empty()) return;
+  const bool wasSpace = SealFile(m_path / kSealFile, m_name, true).Read().Newest() > 0;
+  if (header.isForeign && !wasSpace) {
+    throw IncompatibleSpace("cannot open " + m_name + ": " + kDataFile + ": " + header.fault +
+                            "; name another folder, or restore the space from a backup");
+  }
+  throw DamagedStorage("cannot open " + m_name + ": " + kDataFile + ": " + header.fault +
+                           "; restore the space from a backup",
+                       {m_name, "", OID(), "", std::nullopt});
+}
+
+// Opening a file with its lock makes lock.mdb before LMDB looks at the file, so what is not a space is found out here,
+// without a lock. Without one the tables may be read only while nobody can be writing: before lock.mdb exists.
 void LmdbEnvironment::ProbeData() const {
-  MDB_env* created = nullptr;
-  CheckLmdb(mdb_env_create(&created), "open", m_name);
-  const std::unique_ptr<MDB_env, CloseEnvironment> env(created);
-  CheckLmdb(mdb_env_set_mapsize(env.get(), kMiB), "open",
-            m_name);  // LMDB maps all that is there nevertheless
-  CheckLmdb(mdb_env_set_maxdbs(env.get(), kTableCount), "open", m_name);
-  CheckOpened(mdb_env_open(env.get(), m_path.c_str(), MDB_RDONLY | MDB_NOLOCK | MDB_NOTLS, kFileMode),
-              m_name);
+  const auto file = std::make_shared<PageFile>(m_path / kDataFile, m_name);
+  RequireSoundHeader(*file);
   std::error_code error;
   if (std::filesystem::exists(m_path / kReadersFile, error) || error) return;
-  const Transaction txn = Begin(env.get(), MDB_RDONLY, "open", m_name);
-  if (!OpenTables(txn.get(), m_name) && !m_options.create) ThrowUnfinished(m_name);
+  const std::size_t pageBytes = PageBytesOf(*file);
+  MetaPage newest = ReadMetaPage(*file, 0, pageBytes);
+  const MetaPage other = ReadMetaPage(*file, 1, pageBytes);
+  if (other.transaction > newest.transaction) newest = other;
+  const auto state = ReadState(file, newest, m_name);
+  if (!HoldsSpace(file, *state, m_name) && !m_options.create) ThrowUnfinished(m_name);
 }
 
 void LmdbEnvironment::Open(std::size_t mapBytes) {
@@ -147,6 +168,8 @@ void LmdbEnvironment::Open(std::size_t mapBytes) {
     if (m_options.readOnly) flags |= MDB_RDONLY;
     if (!m_options.syncEachCommit) flags |= MDB_NOSYNC;
     CheckOpened(mdb_env_open(m_env, m_path.c_str(), flags, kFileMode), m_name);
+    m_sealed = std::make_unique<SealedSpace>(m_path, m_name, m_options.readOnly, mapBytes);
+    RequireSoundHeader(*m_sealed->file());
     int deadReaders = 0;
     CheckLmdb(mdb_reader_check(m_env, &deadReaders), "open", m_name);
     OpenOrCreateTables();
@@ -178,58 +201,77 @@ void LmdbEnvironment::Close() noexcept {
   if (m_env == nullptr) return;
   mdb_env_close(m_env);
   m_env = nullptr;
+  m_sealed.reset();
 }
 
 void LmdbEnvironment::OpenOrCreateTables() {
-  Transaction reading = Begin(m_env, MDB_RDONLY, "open", m_name);
-  if (const auto tables = OpenTables(reading.get(), m_name)) {
-    CheckLmdb(mdb_txn_commit(reading.release()), "open", m_name);  // keeps the handles
-    m_tables = *tables;
+  constexpr const char* kOperation = "open";
+  const auto open = [this](Transaction txn) {
+    m_tables = OpenTables(txn.get(), m_name);
+    CheckLmdb(mdb_txn_commit(txn.release()), kOperation, m_name);  // keeps the handles
+  };
+  Reading reading;
+  CheckLmdb(TryBeginRead(true, reading), kOperation, m_name);
+  Transaction txn(reading.txn);
+  if (!reading.known->state->tables.empty()) {
+    open(std::move(txn));
     return;
   }
-  reading.reset();
+  txn.reset();
   if (!m_options.create) ThrowUnfinished(m_name);
-  Transaction writing = Begin(m_env, 0, "make", m_name);
-  const auto madeMeanwhile = OpenTables(writing.get(), m_name);
-  const LmdbTables tables = madeMeanwhile ? *madeMeanwhile : CreateTables(writing.get(), m_name);
-  CheckLmdb(mdb_txn_commit(writing.release()), "make", m_name);
+  const CommitLock lock(*m_sealed);
+  txn = Begin(m_env, 0, "make", m_name);
+  const std::uint64_t transaction = mdb_txn_id(txn.get());
+  const KnownStatePtr known = m_sealed->RequireWritable(transaction - 1);
+  if (!known->state->tables.empty()) {  // somebody has made it meanwhile
+    open(std::move(txn));
+    return;
+  }
+  const LmdbTables tables = CreateTables(txn.get(), m_name);
+  CheckLmdb(mdb_txn_commit(txn.release()), "make", m_name);
+  m_sealed->Committed(transaction);
   m_tables = tables;
 }
 
-MDB_txn* LmdbEnvironment::BeginSnapshot() {
+LmdbEnvironment::Reading LmdbEnvironment::BeginSnapshot() {
   constexpr const char* kOperation = "open a snapshot of";
   RequireOwnProcess(kOperation);
   {
     const std::lock_guard lock(m_state);
-    MDB_txn* txn = nullptr;
-    if (TryBeginRead(&txn) == MDB_SUCCESS) {
+    Reading reading;
+    if (TryBeginRead(false, reading) == MDB_SUCCESS) {
       ++m_openSnapshots;
-      return txn;
+      return reading;
     }
   }
   const std::scoped_lock lock(m_writing, m_state);
-  MDB_txn* txn = BeginReadOrRecover(kOperation);
+  Reading reading = BeginReadOrRecover(kOperation);
   ++m_openSnapshots;
-  return txn;
+  return reading;
 }
 
-void LmdbEnvironment::EndSnapshot(MDB_txn* txn) noexcept {
+void LmdbEnvironment::EndSnapshot(const Reading& reading) noexcept {
   if (!IsOwnProcess()) return;
   const std::lock_guard lock(m_state);
-  mdb_txn_abort(txn);
+  mdb_txn_abort(reading.txn);
   --m_openSnapshots;
 }
 
-void LmdbEnvironment::Write(const char* operation, const std::function<void(MDB_txn*)>& change) {
+void LmdbEnvironment::Write(const char* operation, const std::function<void(SpaceWriter&)>& change) {
   RequireOwnProcess(operation);
   RequireWritable(operation);
   const std::lock_guard writing(m_writing);
   for (;;) {
     try {
       if (m_env == nullptr) throw LmdbError(operation, m_name, MDB_PANIC);
+      const CommitLock lock(*m_sealed);
       Transaction txn = Begin(m_env, 0, operation, m_name);
-      change(txn.get());
+      const std::uint64_t transaction = mdb_txn_id(txn.get());
+      const KnownStatePtr known = m_sealed->RequireWritable(transaction - 1);
+      SpaceWriter writer(txn.get(), m_tables, *known, m_name);
+      change(writer);
       CheckLmdb(mdb_txn_commit(txn.release()), operation, m_name);
+      m_sealed->Committed(transaction);
       return;
     } catch (const LmdbError& error) {
       const std::lock_guard state(m_state);
@@ -239,13 +281,10 @@ void LmdbEnvironment::Write(const char* operation, const std::function<void(MDB_
 }
 
 std::uint64_t LmdbEnvironment::CountRecords() {
-  constexpr const char* kOperation = "measure";
-  RequireOwnProcess(kOperation);
-  const std::scoped_lock lock(m_writing, m_state);
-  const Transaction txn(BeginReadOrRecover(kOperation));
-  MDB_stat stat{};
-  CheckLmdb(mdb_stat(txn.get(), m_tables.records, &stat), kOperation, m_name);
-  return stat.ms_entries;
+  const Reading reading = BeginSnapshot();
+  const std::uint64_t records = reading.known->records;
+  EndSnapshot(reading);
+  return records;
 }
 
 // LMDB prints its reader table as text: process id, thread, and the transaction or a dash.
@@ -273,7 +312,7 @@ std::vector<std::int64_t> LmdbEnvironment::ReadersElsewhere() {
   return {processes.begin(), processes.end()};
 }
 
-int LmdbEnvironment::TryBeginRead(MDB_txn** txn) {
+int LmdbEnvironment::TryBeginTransaction(MDB_txn** txn) {
   if (m_env == nullptr) return MDB_PANIC;
   const int code = mdb_txn_begin(m_env, nullptr, MDB_RDONLY, txn);
   if (code != MDB_READERS_FULL) return code;
@@ -282,11 +321,31 @@ int LmdbEnvironment::TryBeginRead(MDB_txn** txn) {
   return deadReaders == 0 ? code : mdb_txn_begin(m_env, nullptr, MDB_RDONLY, txn);
 }
 
-MDB_txn* LmdbEnvironment::BeginReadOrRecover(const char* operation) {
+// EAGAIN: with `mayWait` it might succeed.
+int LmdbEnvironment::TryBeginRead(bool mayWait, Reading& reading) {
+  // Other processes may commit twice between two steps of a reader, but not again and again.
+  constexpr int kMostTries = 1000;
+  for (int tries = 1;; ++tries) {
+    MDB_txn* begun = nullptr;
+    const int code = TryBeginTransaction(&begun);
+    if (code != MDB_SUCCESS) return code;
+    Transaction txn(begun);
+    const std::uint64_t transaction = mdb_txn_id(begun);
+    const SealedSpace::Answer answer = m_sealed->Ask(transaction, mayWait, reading.known);
+    if (answer == SealedSpace::Answer::kUnsealed) return EAGAIN;
+    if (answer == SealedSpace::Answer::kKnown) {
+      reading.txn = txn.release();
+      return MDB_SUCCESS;
+    }
+    if (tries == kMostTries) m_sealed->ThrowLostCommit(transaction);
+  }
+}
+
+LmdbEnvironment::Reading LmdbEnvironment::BeginReadOrRecover(const char* operation) {
   for (;;) {
-    MDB_txn* txn = nullptr;
-    const int code = TryBeginRead(&txn);
-    if (code == MDB_SUCCESS) return txn;
+    Reading reading;
+    const int code = TryBeginRead(true, reading);
+    if (code == MDB_SUCCESS) return reading;
     Recover(code, operation);
   }
 }
@@ -319,6 +378,7 @@ void LmdbEnvironment::Grow(const char* operation) {
     return;  // their pages are free now
   RequireNoSnapshots(MDB_MAP_FULL, operation);
   const std::size_t old = m_mapBytes;
+  m_sealed->file()->Remap(2 * old);  // what is committed must be readable
   const int code = mdb_env_set_mapsize(m_env, 2 * old);
   if (code != MDB_SUCCESS) {
     Close();  // its map is gone
@@ -330,14 +390,19 @@ void LmdbEnvironment::Grow(const char* operation) {
 
 void LmdbEnvironment::AdoptGrowth(const char* operation) {
   RequireNoSnapshots(MDB_MAP_RESIZED, operation);
-  if (mdb_env_set_mapsize(m_env, 0) != MDB_SUCCESS) {
+  const auto remap = [this, operation] {
+    MDB_envinfo info{};
+    CheckLmdb(mdb_env_set_mapsize(m_env, 0), operation, m_name);
+    CheckLmdb(mdb_env_info(m_env, &info), operation, m_name);
+    m_sealed->file()->Remap(info.me_mapsize);
+    m_mapBytes = info.me_mapsize;
+  };
+  try {
+    remap();
+  } catch (const LmdbError&) {
     Close();  // its map is gone, and the other process may map more than this one: take what there is
     OpenFlexibly();
-    return;
   }
-  MDB_envinfo info{};
-  CheckLmdb(mdb_env_info(m_env, &info), operation, m_name);
-  m_mapBytes = info.me_mapsize;
 }
 
 void LmdbEnvironment::RequireNoSnapshots(int code, const char* operation) const {

@@ -15,6 +15,7 @@
 #include <cstdint>
 #include <filesystem>
 #include <functional>
+#include <memory>
 #include <mutex>
 #include <optional>
 #include <string>
@@ -22,11 +23,14 @@
 
 #include "engines/lmdb/lmdb_engine.h"
 #include "engines/lmdb/lmdb_layout.h"
+#include "engines/lmdb/sealed_space.h"
 #include "engines/lmdb/space_folder.h"
 
 struct MDB_env;
 
 namespace vemo {
+
+class SpaceWriter;
 
 class LmdbEnvironment {
  public:
@@ -37,20 +41,27 @@ class LmdbEnvironment {
 
   const std::string& name() const noexcept { return m_name; }
   const std::filesystem::path& path() const noexcept { return m_path; }
-  const LmdbTables& tables() const noexcept { return m_tables; }  // stable while a transaction is open
 
   // Throws StoreError when the environment was opened by the process that forked this one.
   void RequireOwnProcess(const char* operation) const;
   // Throws StoreError when the space was opened read-only.
   void RequireWritable(const char* operation) const;
 
-  // A read transaction of the newest commit, to be given back to EndSnapshot on any thread.
-  MDB_txn* BeginSnapshot();
-  void EndSnapshot(MDB_txn* txn) noexcept;
+  // A read transaction, and what is known of the commit that it keeps.
+  struct Reading {
+    MDB_txn* txn = nullptr;
+    KnownStatePtr known;
+  };
+
+  // Reads the newest commit; to be given back to EndSnapshot on any thread. Throws DamagedStorage where what all reading
+  // starts from is damaged.
+  Reading BeginSnapshot();
+  void EndSnapshot(const Reading& reading) noexcept;
 
   // Runs `change` in a write transaction and commits it; runs it again when the map had to grow. When it or
-  // the commit throws, nothing was applied.
-  void Write(const char* operation, const std::function<void(MDB_txn*)>& change);
+  // the commit throws, nothing was applied. Throws DamagedStorage before anything is written where that could
+  // lose data.
+  void Write(const char* operation, const std::function<void(SpaceWriter&)>& change);
 
   // The number of records in the newest commit.
   std::uint64_t CountRecords();
@@ -61,14 +72,16 @@ class LmdbEnvironment {
  private:
   bool IsOwnProcess() const noexcept;
   void ProbeData() const;
+  void RequireSoundHeader(PageFile& file) const;
   void Open(std::size_t mapBytes);
   void OpenFlexibly();
   void Close() noexcept;
   void OpenOrCreateTables();
 
   // The functions below need m_state; those that change the map need m_writing as well.
-  int TryBeginRead(MDB_txn** txn);
-  MDB_txn* BeginReadOrRecover(const char* operation);
+  int TryBeginTransaction(MDB_txn** txn);
+  int TryBeginRead(bool mayWait, Reading& reading);
+  Reading BeginReadOrRecover(const char* operation);
   void Recover(int code, const char* operation);
   void Grow(const char* operation);
   void AdoptGrowth(const char* operation);
@@ -78,11 +91,13 @@ class LmdbEnvironment {
   const std::string m_name;
   const std::filesystem::path m_path;
   const pid_t m_process;
+  const std::uint64_t m_forks;  // tells m_process from its children
   std::optional<FolderClaim> m_claim;
 
   std::mutex m_writing;
   std::mutex m_state;
   MDB_env* m_env = nullptr;
+  std::unique_ptr<SealedSpace> m_sealed;  // of the open environment
   LmdbTables m_tables;
   std::size_t m_mapBytes = 0;
   std::size_t m_openSnapshots = 0;

@@ -2,106 +2,118 @@
 
 #include <lmdb.h>
 
-#include <array>
+#define XXH_INLINE_ALL
+#include <xxhash.h>
+
 #include <cstring>
-#include <string_view>
 
 #include "engines/lmdb/big_endian.h"
 #include "engines/lmdb/lmdb_error.h"
+#include "engines/lmdb/tree_cursor.h"
 
 namespace vemo {
 namespace {
 
 constexpr std::string_view kMagic = "vemo space";
 constexpr std::string_view kLayoutKey = "layout";
-constexpr std::string_view kGenerationKey = "generation";
-constexpr std::string_view kNextIdKey = "next id";
-constexpr const char* kSystemTable = "system";
+constexpr std::size_t kUnsealedLayoutBytes = kMagic.size() + sizeof(BigEndian64);  // of layout 1
 
 struct TableName {
   unsigned LmdbTables::*handle;
   const char* name;
 };
-constexpr std::array<TableName, kTableCount> kTables{{{&LmdbTables::records, "records"},
+constexpr std::array<TableName, kTableCount> kTables{{{&LmdbTables::records, kRecordsTable.data()},
                                                       {&LmdbTables::info, "info"},
                                                       {&LmdbTables::roots, "roots"},
                                                       {&LmdbTables::meta, "meta"},
-                                                      {&LmdbTables::deletions, "deletions"},
-                                                      {&LmdbTables::system, kSystemTable}}};
+                                                      {&LmdbTables::deletions, kDeletionsTable.data()},
+                                                      {&LmdbTables::system, kSystemTable.data()}}};
 
-MDB_val ToVal(std::string_view text) {
-  return {text.size(), const_cast<char*>(text.data())};
+std::string_view TextOf(ByteView bytes) {
+  return {reinterpret_cast<const char*>(bytes.data()), bytes.size()};
 }
 
-void Put(MDB_txn* txn, const LmdbTables& tables, std::string_view key, std::string_view value,
-         const std::string& space) {
-  MDB_val k = ToVal(key);
-  MDB_val v = ToVal(value);
-  CheckLmdb(mdb_put(txn, tables.system, &k, &v, 0), "write to", space);
+std::uint64_t Checksum(std::string_view key, std::string_view bytes) {
+  return XXH3_64bits_withSeed(bytes.data(), bytes.size(), ValueTag(TableSeed(kSystemTable), key));
 }
 
-void PutNumber(MDB_txn* txn, const LmdbTables& tables, std::string_view key, std::uint64_t number,
-               const std::string& space) {
-  const BigEndian64 bytes = ToBigEndian(number);
-  Put(txn, tables, key, {reinterpret_cast<const char*>(bytes.data()), bytes.size()}, space);
+std::string Seal(std::string_view key, std::string_view bytes) {
+  const std::uint64_t checksum = Checksum(key, bytes);
+  std::string sealed(bytes);
+  sealed.append(reinterpret_cast<const char*>(&checksum), sizeof checksum);
+  return sealed;
 }
 
-std::uint64_t ReadNumber(MDB_txn* txn, const LmdbTables& tables, std::string_view key,
-                         const std::string& space) {
-  MDB_val k = ToVal(key);
-  MDB_val v{};
-  const int code = mdb_get(txn, tables.system, &k, &v);
-  if (code != MDB_NOTFOUND) CheckLmdb(code, "read", space);
-  if (code == MDB_NOTFOUND || v.mv_size != sizeof(BigEndian64)) {
-    throw IncompatibleSpace("cannot read " + space + ": its " + std::string(key) +
-                            " is missing or damaged; restore the space from a backup");
-  }
-  return FromBigEndian(v.mv_data);
+bool IsSealed(std::string_view key, std::string_view value) {
+  if (value.size() < sizeof(std::uint64_t)) return false;
+  const std::string_view bytes = value.substr(0, value.size() - sizeof(std::uint64_t));
+  return LoadAs<std::uint64_t>(value.data() + bytes.size()) == Checksum(key, bytes);
+}
+
+void Put(MDB_txn* txn, unsigned table, std::string_view key, std::string_view value, const std::string& space) {
+  MDB_val k{key.size(), const_cast<char*>(key.data())};
+  MDB_val v{value.size(), const_cast<char*>(value.data())};
+  CheckLmdb(mdb_put(txn, table, &k, &v, 0), "write to", space);
+}
+
+std::uint64_t ReadNumber(PageReader& reader, const SpaceState& state, std::string_view key) {
+  const PageTable* system = state.Table(kSystemTable);
+  const auto fail = [&](const char* what) {
+    const std::string fault = "its " + std::string(key) + " is " + what;
+    reader.Fail(system->root.root, *system, fault.c_str(), {});
+  };
+  TreeCursor cursor(reader, *system);
+  if (!cursor.Find(key)) fail("missing");
+  const std::string_view value = TextOf(cursor.StoredValue());
+  if (value.size() != sizeof(StoredNumber) || !IsSealed(key, value)) fail("damaged");
+  return FromBigEndian(value.data());
 }
 
 [[noreturn]] void ThrowForeign(const std::string& space) {
-  throw IncompatibleSpace("cannot open " + space +
-                          ": it is an LMDB environment of another program, not a space");
+  throw IncompatibleSpace("cannot open " + space + ": it is an LMDB environment of another program, not a space");
 }
 
-void CheckLayout(MDB_txn* txn, unsigned system, const std::string& space) {
-  MDB_val key = ToVal(kLayoutKey);
-  MDB_val value{};
-  const int code = mdb_get(txn, system, &key, &value);
-  if (code == MDB_NOTFOUND) ThrowForeign(space);
-  CheckLmdb(code, "open", space);
-  if (value.mv_size != kMagic.size() + sizeof(BigEndian64) ||
-      std::memcmp(value.mv_data, kMagic.data(), kMagic.size()) != 0) {
-    ThrowForeign(space);
+void CheckLayout(PageReader& reader, const PageTable& system, const std::string& space) {
+  TreeCursor cursor(reader, system);
+  if (!cursor.Find(kLayoutKey)) ThrowForeign(space);
+  const std::string_view value = TextOf(cursor.StoredValue());
+  const bool isSealed = IsSealed(kLayoutKey, value);
+  if (!isSealed && value.size() != kUnsealedLayoutBytes) {
+    if (value.size() != kUnsealedLayoutBytes + sizeof(std::uint64_t)) ThrowForeign(space);
+    cursor.Fail("its layout number is damaged");
   }
-  const std::uint64_t layout = FromBigEndian(static_cast<const char*>(value.mv_data) + kMagic.size());
-  if (layout == kLayoutNumber) return;
+  if (value.size() < kUnsealedLayoutBytes || !value.starts_with(kMagic)) ThrowForeign(space);
+  const std::uint64_t layout = FromBigEndian(value.data() + kMagic.size());
+  if (layout == kLayoutNumber && isSealed) return;
+  if (layout == kLayoutNumber) cursor.Fail("its layout number is damaged");
   throw IncompatibleSpace("cannot open " + space + ": its layout is number " + std::to_string(layout) +
                           ", and this version of vemo knows " + std::to_string(kLayoutNumber) +
-                          " only; open it with the version that wrote it or a newer one");
+                          " only; open it with a version that knows the other");
 }
 
 }  // namespace
 
-std::optional<LmdbTables> OpenTables(MDB_txn* txn, const std::string& space) {
-  MDB_dbi main = 0;
-  CheckLmdb(mdb_dbi_open(txn, nullptr, 0, &main), "open", space);
-  MDB_stat stat{};
-  CheckLmdb(mdb_stat(txn, main, &stat), "open", space);
-  if (stat.ms_entries == 0) return std::nullopt;
-
-  LmdbTables tables;
-  int code = mdb_dbi_open(txn, kSystemTable, 0, &tables.system);
-  if (code == MDB_NOTFOUND || code == MDB_INCOMPATIBLE) ThrowForeign(space);
-  CheckLmdb(code, "open", space);
-  CheckLayout(txn, tables.system, space);
-  for (const TableName& table : kTables) {
-    code = mdb_dbi_open(txn, table.name, 0, &(tables.*table.handle));
-    if (code == MDB_NOTFOUND || code == MDB_INCOMPATIBLE) {
-      throw IncompatibleSpace("cannot open " + space + ": its table \"" + table.name +
-                              "\" is missing or damaged; restore the space from a backup");
+bool HoldsSpace(const std::shared_ptr<PageFile>& file, const SpaceState& state, const std::string& space) {
+  if (state.main.root.flags != 0) ThrowForeign(space);
+  if (state.tables.empty() && !state.hasOtherEntries) return false;
+  const PageTable* system = state.Table(kSystemTable);
+  if (system == nullptr || system->root.flags != 0) ThrowForeign(space);
+  PageReader reader = MakeReader(file, state, space);
+  CheckLayout(reader, *system, space);
+  for (const TableName& name : kTables) {
+    const PageTable* table = state.Table(name.name);
+    if (table == nullptr || table->root.flags != 0) {
+      reader.Fail(state.main.root.root, state.main,
+                  ("the table \"" + std::string(name.name) + "\" is missing or damaged").c_str(), {});
     }
-    CheckLmdb(code, "open", space);
+  }
+  return true;
+}
+
+LmdbTables OpenTables(MDB_txn* txn, const std::string& space) {
+  LmdbTables tables;
+  for (const TableName& table : kTables) {
+    CheckLmdb(mdb_dbi_open(txn, table.name, 0, &(tables.*table.handle)), "open", space);
   }
   return tables;
 }
@@ -114,27 +126,30 @@ LmdbTables CreateTables(MDB_txn* txn, const std::string& space) {
   const BigEndian64 number = ToBigEndian(kLayoutNumber);
   std::string layout(kMagic);
   layout.append(number.begin(), number.end());
-  Put(txn, tables, kLayoutKey, layout, space);
-  WriteGeneration(txn, tables, 0, space);
-  WriteNextId(txn, tables, 1, space);
+  Put(txn, tables.system, kLayoutKey, Seal(kLayoutKey, layout), space);
+  const auto putNumber = [&](std::string_view key, std::uint64_t value) {
+    const StoredNumber stored = StoreNumber(key, value);
+    Put(txn, tables.system, key, TextOf(stored), space);
+  };
+  putNumber(kGenerationKey, 0);
+  putNumber(kNextIdKey, 1);
   return tables;
 }
 
-std::uint64_t ReadGeneration(MDB_txn* txn, const LmdbTables& tables, const std::string& space) {
-  return ReadNumber(txn, tables, kGenerationKey, space);
+StoredNumber StoreNumber(std::string_view key, std::uint64_t number) {
+  const BigEndian64 bytes = ToBigEndian(number);
+  const std::string sealed = Seal(key, TextOf(bytes));
+  StoredNumber stored;
+  std::memcpy(stored.data(), sealed.data(), stored.size());
+  return stored;
 }
 
-std::uint64_t ReadNextId(MDB_txn* txn, const LmdbTables& tables, const std::string& space) {
-  return ReadNumber(txn, tables, kNextIdKey, space);
+std::uint64_t ReadGeneration(PageReader& reader, const SpaceState& state) {
+  return ReadNumber(reader, state, kGenerationKey);
 }
 
-void WriteGeneration(MDB_txn* txn, const LmdbTables& tables, std::uint64_t generation,
-                     const std::string& space) {
-  PutNumber(txn, tables, kGenerationKey, generation, space);
-}
-
-void WriteNextId(MDB_txn* txn, const LmdbTables& tables, std::uint64_t nextId, const std::string& space) {
-  PutNumber(txn, tables, kNextIdKey, nextId, space);
+SpaceNumbers ReadNumbers(PageReader& reader, const SpaceState& state) {
+  return {ReadNumber(reader, state, kGenerationKey), ReadNumber(reader, state, kNextIdKey)};
 }
 
 }  // namespace vemo

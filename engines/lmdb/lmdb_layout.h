@@ -1,22 +1,28 @@
 // What a space looks like inside LMDB.
 //
 //   table        key                     value
-//   records      object id, 8 bytes BE   the record
-//   info         name                    the value
-//   roots        name                    the value
-//   meta         name                    the value
-//   deletions    object id, 8 bytes BE   nothing
-//   system       "layout"                "vemo space", then the layout number, 8 bytes BE
-//                "generation"            8 bytes BE
-//                "next id"               8 bytes BE
+//   records      object id, 8 bytes BE   tag, the record
+//   info         name                    tag, the value
+//   roots        name                    tag, the value
+//   meta         name                    tag, the value
+//   deletions    object id, 8 bytes BE   tag
+//   system       "layout"                "vemo space", then the layout number, 8 bytes BE, then a checksum
+//                "generation"            8 bytes BE, then a checksum
+//                "next id"               8 bytes BE, then a checksum
 //
-// One transaction makes all of it: an environment has no table at all, or is a whole space, or is somebody
-// else's.
+// A tag is the XXH3-64 of the key, seeded with the XXH3-64 of the table's name, 8 bytes LE: it tells a value that is
+// reached under a wrong key or in a wrong table. A checksum is the XXH3-64 of the bytes before it, seeded with the tag
+// that the key would have. One transaction makes all of it: an environment has no table at all, or is a whole space, or
+// is somebody else's.
 #pragma once
 
+#include <array>
 #include <cstdint>
-#include <optional>
+#include <memory>
 #include <string>
+#include <string_view>
+
+#include "engines/lmdb/space_state.h"
 
 struct MDB_txn;
 
@@ -32,21 +38,34 @@ struct LmdbTables {
   unsigned system = 0;
 };
 
-inline constexpr std::uint64_t kLayoutNumber = 1;
+inline constexpr std::uint64_t kLayoutNumber = 2;
 inline constexpr int kTableCount = 6;
+inline constexpr std::string_view kRecordsTable = "records";
+inline constexpr std::string_view kDeletionsTable = "deletions";
+inline constexpr std::string_view kSystemTable = "system";
 
-// Opens the tables of the space that `txn` sees; nothing when its environment has no table at all. Throws
-// IncompatibleSpace for anything else than a space of this layout. `space` is the name for messages.
-std::optional<LmdbTables> OpenTables(MDB_txn* txn, const std::string& space);
+// Whether `state` holds a space: false when there is no table at all. Throws IncompatibleSpace for anything else than a
+// space of this layout, DamagedStorage for a damaged one. `space` is the name for messages.
+bool HoldsSpace(const std::shared_ptr<PageFile>& file, const SpaceState& state, const std::string& space);
+
+// The handles of the tables, which are there.
+LmdbTables OpenTables(MDB_txn* txn, const std::string& space);
 
 // Makes an empty space in an environment without tables.
 LmdbTables CreateTables(MDB_txn* txn, const std::string& space);
 
-// The numbers of the system table. Reading throws IncompatibleSpace when they are missing.
-std::uint64_t ReadGeneration(MDB_txn* txn, const LmdbTables& tables, const std::string& space);
-std::uint64_t ReadNextId(MDB_txn* txn, const LmdbTables& tables, const std::string& space);
-void WriteGeneration(MDB_txn* txn, const LmdbTables& tables, std::uint64_t generation,
-                     const std::string& space);
-void WriteNextId(MDB_txn* txn, const LmdbTables& tables, std::uint64_t nextId, const std::string& space);
+// The numbers of the system table. Throws DamagedStorage when they are missing or not what was written.
+struct SpaceNumbers {
+  std::uint64_t generation = 0;
+  std::uint64_t nextId = 1;
+};
+std::uint64_t ReadGeneration(PageReader& reader, const SpaceState& state);
+SpaceNumbers ReadNumbers(PageReader& reader, const SpaceState& state);
+
+// The keys and values of the numbers, as they are stored.
+inline constexpr std::string_view kGenerationKey = "generation";
+inline constexpr std::string_view kNextIdKey = "next id";
+using StoredNumber = std::array<std::uint8_t, 16>;
+StoredNumber StoreNumber(std::string_view key, std::uint64_t number);
 
 }  // namespace vemo

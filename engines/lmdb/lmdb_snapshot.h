@@ -4,11 +4,13 @@
 #include <memory>
 
 #include "engines/lmdb/lmdb_environment.h"
+#include "engines/lmdb/tree_cursor.h"
 #include "store/engine.h"
 
 namespace vemo {
 
-// Views point into the map of the environment, which stays as it is while the transaction is open.
+// Reads without LMDB (page_reader.h), whose transaction keeps the pages. Views point into the map of data.mdb, which
+// stays while the snapshot is open.
 class LmdbSnapshot final : public EngineSnapshot {
  public:
   explicit LmdbSnapshot(std::shared_ptr<LmdbEnvironment> environment);
@@ -23,18 +25,19 @@ class LmdbSnapshot final : public EngineSnapshot {
   void ScanNamed(NamedTable table, std::string_view prefix,
                  const std::function<bool(std::string_view, ByteView)>& visit) const override;
   std::vector<OID> QueuedDeletions(std::size_t limit) const override;
+  std::vector<StorageFinding> CheckStorage() const override;
 
  private:
-  std::optional<ByteView> Get(unsigned table, std::string_view key) const;
-  void Scan(unsigned table, std::string_view first,
-            const std::function<bool(std::string_view, ByteView)>& visit) const;
+  const SpaceState& State() const noexcept { return *m_reading.known->state; }
+  const PageTable& Table(std::string_view name) const noexcept { return *State().Table(name); }
+  void Scan(std::string_view table, std::string_view first,
+            const std::function<bool(TreeCursor&)>& visit) const;
 
   std::shared_ptr<LmdbEnvironment> m_environment;
-  MDB_txn* m_txn;
+  LmdbEnvironment::Reading m_reading;
+  mutable PageReader m_reader;  // remembers the pages that it has checked
+  mutable TreeCursor m_records;
   std::uint64_t m_generation = 0;
 };
-
-// The handle of a table of named values.
-unsigned TableOf(NamedTable table, const LmdbTables& tables);
 
 }  // namespace vemo

@@ -11,6 +11,7 @@
 #include <utility>
 
 #include "engines/lmdb/lmdb_error.h"
+#include "engines/lmdb/seal_file.h"
 #include "store/error.h"
 
 namespace vemo {
@@ -19,7 +20,7 @@ namespace {
 namespace fs = std::filesystem;
 
 bool IsOurs(const fs::path& file) {
-  return file == kDataFile || file == kReadersFile || file == kWriterLockFile;
+  return file == kDataFile || file == kReadersFile || file == kWriterLockFile || file == kSealFile;
 }
 
 // The first file in `path` that this engine does not make, or nothing.
@@ -32,6 +33,14 @@ fs::path ForeignFile(const fs::path& path, const std::string& space) {
   }
   if (error) throw LmdbError("look into the folder of", space, error.value());
   return {};
+}
+
+// Where a commit was sealed, there was a data.mdb with something in it.
+void RequireNeverSealed(const fs::path& path, const std::string& space) {
+  if (SealFile(path / kSealFile, space, true).Read().Newest() == 0) return;
+  throw DamagedStorage("cannot open " + space + ": its " + kDataFile + " is missing or empty, and " + kSealFile +
+                           " tells of commits; restore the space from a backup",
+                       {space, "", OID(), "", std::nullopt});
 }
 
 void SyncOneFolder(const fs::path& path, const std::string& space) {
@@ -69,6 +78,7 @@ FolderContents ExamineFolder(const fs::path& path, const std::string& space) {
   }
   const fs::file_status data = fs::status(path / kDataFile, error);
   if (data.type() == fs::file_type::not_found) {
+    RequireNeverSealed(path, space);
     const fs::path foreign = ForeignFile(path, space);
     if (foreign.empty()) return FolderContents::kNothingYet;
     throw IncompatibleSpace("cannot open " + space + ": the folder holds other files (" + foreign.string() +
@@ -81,6 +91,7 @@ FolderContents ExamineFolder(const fs::path& path, const std::string& space) {
   const std::uintmax_t bytes = fs::file_size(path / kDataFile, error);
   if (error) throw LmdbError("look into the folder of", space, error.value());
   if (bytes != 0) return FolderContents::kData;
+  RequireNeverSealed(path, space);
   const fs::path foreign = ForeignFile(path, space);
   if (foreign.empty()) return FolderContents::kNothingYet;
   throw IncompatibleSpace("cannot open " + space + ": " + kDataFile + " is empty and other files (" +

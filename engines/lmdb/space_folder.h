@@ -11,6 +11,7 @@ namespace vemo {
 inline constexpr const char* kDataFile = "data.mdb";
 inline constexpr const char* kReadersFile = "lock.mdb";
 inline constexpr const char* kWriterLockFile = "writer.lock";
+inline constexpr const char* kSealFile = "data.seal";
 
 enum class FolderContents {
   kNothingYet,  // an absent or empty folder, or what a creation left that ended before its first byte

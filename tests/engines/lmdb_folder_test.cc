@@ -4,6 +4,7 @@
 
 #include <cstdlib>
 
+#include "engines/lmdb/page_reader.h"
 #include "platform/error.h"
 #include "tests/engines/lmdb_site.h"
 #include "tests/support/temp_folder.h"
@@ -13,7 +14,7 @@ namespace {
 
 namespace fs = std::filesystem;
 
-const std::set<std::string> kSpaceFiles{"data.mdb", "lock.mdb"};
+const std::set<std::string> kSpaceFiles{"data.mdb", "data.seal", "lock.mdb"};
 
 class LmdbFolder : public testing::Test {
  protected:
@@ -141,7 +142,7 @@ TEST_F(LmdbFolder, ASpaceWithoutOneOfItsTablesIsRefused) {
     ASSERT_EQ(mdb_dbi_open(txn, "roots", 0, &dbi), 0);
     ASSERT_EQ(mdb_drop(txn, dbi, 1), 0);
   });
-  const std::string message = MessageOf<IncompatibleSpace>([&] { OpenAt(space()); });
+  const std::string message = MessageOf<DamagedStorage>([&] { OpenAt(space()); });
   EXPECT_TRUE(Contains(message, "\"roots\"")) << message;
 }
 
@@ -154,27 +155,28 @@ TEST_F(LmdbFolder, ADataFileThatIsAFolderIsRefused) {
 
 TEST_F(LmdbFolder, ASpaceThatLostItsNumbersIsRefusedWithTheirName) {
   OpenAt(space(), true);
-  MakeEnvironment(space(), [](MDB_txn* txn) {
-    PutText(txn, "system", "generation", "short");
-    PutText(txn, "system", "next id", "");
-  });
+  MakeEnvironment(space(), [](MDB_txn* txn) { PutText(txn, "system", "next id", ""); });
   const auto engine = OpenAt(space());
-  const std::string generation = MessageOf<IncompatibleSpace>([&] { engine->OpenSnapshot(); });
-  EXPECT_TRUE(Contains(generation, "its generation is missing or damaged")) << generation;
-  const std::string nextId = MessageOf<IncompatibleSpace>([&] { engine->ReserveIds(1); });
-  EXPECT_TRUE(Contains(nextId, "its next id is missing or damaged")) << nextId;
-  EXPECT_EQ(engine->Usage().records, 0u);
+  EXPECT_EQ(NewestContents(*engine), Contents());
+  const std::string nextId = MessageOf<DamagedStorage>([&] { engine->ReserveIds(1); });
+  EXPECT_TRUE(Contains(nextId, "its next id is damaged")) << nextId;
+  MakeEnvironment(space(), [](MDB_txn* txn) { PutText(txn, "system", "generation", "short"); });
+  const std::string generation = MessageOf<DamagedStorage>([&] { engine->OpenSnapshot(); });
+  EXPECT_TRUE(Contains(generation, "its generation is damaged")) << generation;
 }
 
 TEST_F(LmdbFolder, AKeyThatIsNoIdIsRefusedWhereAScanMeetsIt) {
   BatchBuilder batch;
   batch.Put(1, "one");
   OpenAt(space(), true)->Commit(batch.At(0));
-  MakeEnvironment(space(), [](MDB_txn* txn) { PutText(txn, "records", "short", "value"); });
+  // With the tag that a value under this key would have.
+  const std::uint64_t tag = ValueTag(TableSeed("records"), "short");
+  const std::string value(reinterpret_cast<const char*>(&tag), sizeof tag);
+  MakeEnvironment(space(), [&](MDB_txn* txn) { PutText(txn, "records", "short", value); });
   const auto engine = OpenAt(space());
   const auto snapshot = engine->OpenSnapshot();
   EXPECT_EQ(ToText(snapshot->Read(OID(1))), "one");
-  EXPECT_THROW(AllRecords(*snapshot), IncompatibleSpace);
+  EXPECT_THROW(AllRecords(*snapshot), DamagedStorage);
 }
 
 TEST_F(LmdbFolder, ACreationInterruptedBeforeItsFirstByteIsFinished) {

@@ -151,18 +151,20 @@ INSTANTIATE_TEST_SUITE_P(Failing, LmdbDisk, testing::Bool(),
                          });
 
 TEST_P(LmdbDisk, ACommitThatFailsAnywhereAppliesNothingAndCanBeRepeated) {
-  const auto engine = OpenAt(space(), true);
+  auto engine = OpenAt(space(), true);
   BatchBuilder batch = Megabytes(2);
   batch.Name(NamedTable::kRoots, "root", "value").Queue(7);
   std::uint64_t generation = 0;
   bool failed = true;
+  bool sealFailed = false;
   int failures = 0;
-  for (int nth = 1; failed; ++nth) {
+  for (int nth = 1; failed || sealFailed; ++nth) {
     const Contents before = NewestContents(*engine);
     {
       const FailingDisk disk(nth, StaysBroken());
       failed = CommitFails(*engine, batch.At(generation));
-      ASSERT_EQ(failed, disk.HasFailed()) << "call " << nth;
+      // What is written last of all, and not synced, is the seal: the commit does not depend on it.
+      sealFailed = !failed && disk.HasFailed();
     }
     if (failed) {
       ++failures;
@@ -170,6 +172,13 @@ TEST_P(LmdbDisk, ACommitThatFailsAnywhereAppliesNothingAndCanBeRepeated) {
       ASSERT_EQ(engine->Commit(batch.At(generation)), generation + 1) << "call " << nth;
     }
     ++generation;
+    ASSERT_EQ(NewestContents(*engine).generation, generation);
+    // Without its seal the commit is checked when the space is opened.
+    if (sealFailed) {
+      engine.reset();
+      engine = OpenAt(space());
+      ASSERT_EQ(NewestContents(*engine).generation, generation);
+    }
   }
   EXPECT_GE(failures, 3) << "pages, a sync and the page that makes them count";
 }
@@ -231,7 +240,6 @@ TEST_P(LmdbDisk, ACreationThatFailsAnywhereCanBeRepeated) {
       } catch (const StoreError&) {
         ++failures;
       }
-      ASSERT_EQ(failed, disk.HasFailed()) << "call " << nth;
     }
     ASSERT_EQ(NewestContents(*OpenAt(space(), true)), Contents()) << "call " << nth;
     std::filesystem::remove_all(space());

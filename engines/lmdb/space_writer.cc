@@ -1,0 +1,100 @@
+#include "engines/lmdb/space_writer.h"
+
+#include <lmdb.h>
+
+#include <cstring>
+
+#include "engines/lmdb/big_endian.h"
+#include "engines/lmdb/lmdb_error.h"
+
+namespace vemo {
+namespace {
+
+constexpr const char* kOperation = "write to";
+
+MDB_val ToVal(std::string_view text) { return {text.size(), const_cast<char*>(text.data())}; }
+
+}  // namespace
+
+const char* TableNameOf(NamedTable table) noexcept {
+  switch (table) {
+    case NamedTable::kInfo:
+      return "info";
+    case NamedTable::kRoots:
+      return "roots";
+    case NamedTable::kMeta:
+      break;
+  }
+  return "meta";
+}
+
+SpaceWriter::IdKey::IdKey(OID oid) noexcept {
+  const BigEndian64 key = ToBigEndian(oid.m_value);
+  std::memcpy(bytes, key.data(), sizeof bytes);
+}
+
+SpaceWriter::SpaceWriter(MDB_txn* txn, const LmdbTables& tables, const KnownState& known, const std::string& space)
+    : m_txn(txn),
+      m_known(known),
+      m_space(space),
+      m_reader(MakeReader(known.file, *known.state, space)),
+      m_records(MakeTable(tables.records, kRecordsTable)),
+      m_info(MakeTable(tables.info, TableNameOf(NamedTable::kInfo))),
+      m_roots(MakeTable(tables.roots, TableNameOf(NamedTable::kRoots))),
+      m_meta(MakeTable(tables.meta, TableNameOf(NamedTable::kMeta))),
+      m_deletions(MakeTable(tables.deletions, kDeletionsTable)),
+      m_system(MakeTable(tables.system, kSystemTable)) {}
+
+SpaceWriter::Table SpaceWriter::MakeTable(unsigned handle, std::string_view name) {
+  const PageTable& table = *m_known.state->Table(name);  // a space has all of them: HoldsSpace
+  return {handle, table, TreeCursor(m_reader, table)};
+}
+
+SpaceWriter::Table& SpaceWriter::Named(NamedTable table) noexcept {
+  switch (table) {
+    case NamedTable::kInfo:
+      return m_info;
+    case NamedTable::kRoots:
+      return m_roots;
+    case NamedTable::kMeta:
+      break;
+  }
+  return m_meta;
+}
+
+// Whether the key is there.
+bool SpaceWriter::Check(Table& table, std::string_view key) {
+  if (!table.cursor.Find(key)) return false;
+  table.cursor.StoredValue();
+  return true;
+}
+
+// Room for a value, to be filled at once.
+std::uint8_t* SpaceWriter::Reserve(Table& table, std::string_view key, std::size_t bytes) {
+  Check(table, key);
+  MDB_val k = ToVal(key);
+  MDB_val room{bytes, nullptr};
+  CheckLmdb(mdb_put(m_txn, table.handle, &k, &room, MDB_RESERVE), kOperation, m_space);
+  return static_cast<std::uint8_t*>(room.mv_data);
+}
+
+void SpaceWriter::Put(Table& table, std::string_view key, ByteView value) {
+  std::uint8_t* room = Reserve(table, key, kTagBytes + value.size());
+  const std::uint64_t tag = ValueTag(table.pages.seed, key);
+  std::memcpy(room, &tag, kTagBytes);
+  if (!value.empty()) std::memcpy(room + kTagBytes, value.data(), value.size());
+}
+
+void SpaceWriter::PutNumber(std::string_view key, std::uint64_t number) {
+  const StoredNumber stored = StoreNumber(key, number);
+  std::memcpy(Reserve(m_system, key, stored.size()), stored.data(), stored.size());
+}
+
+void SpaceWriter::Remove(Table& table, std::string_view key) {
+  if (Check(table, key)) table.cursor.CheckNeighbours();
+  MDB_val k = ToVal(key);
+  const int code = mdb_del(m_txn, table.handle, &k, nullptr);
+  if (code != MDB_NOTFOUND) CheckLmdb(code, kOperation, m_space);
+}
+
+}  // namespace vemo
