@@ -18,6 +18,9 @@ class SpaceCheck {
       : m_snapshot(snapshot), m_progress(progress) {}
 
   VerifyReport Run() {
+    for (const StorageFinding& finding : State().CheckStorage()) {
+      Find("", OID(), (finding.page ? "page " + std::to_string(*finding.page) + ": " : "") + finding.what);
+    }
     CheckNamedValues();
     for (const std::string& name : RootNames()) CheckRoot(name);
     CheckRecords();
@@ -28,27 +31,59 @@ class SpaceCheck {
   void Find(const std::string& root, OID oid, const std::string& fault) { m_report.findings.push_back({root, oid, fault}); }
   const EngineSnapshot& State() { return m_snapshot.Objects().State(); }
 
+  // Runs a step that the engine may have to leave where it meets damage; what is behind it goes unchecked.
+  template <typename Step>
+  void AsFarAsReadable(const Step& step) {
+    try {
+      step();
+    } catch (const DamagedStorage& damaged) {
+      Find("", OID(), damaged.what());
+    }
+  }
+
+  // Calls `visit` for all records that the engine can read.
+  void ScanReadableRecords(const std::function<void(OID, ByteView)>& visit) {
+    for (OID first(1);;) {
+      try {
+        State().ScanRecords(first, [&](OID oid, ByteView record) {
+          visit(oid, record);
+          return true;
+        });
+        return;
+      } catch (const DamagedStorage& damaged) {
+        if (!(first < damaged.next())) return;
+        first = damaged.next();
+      }
+    }
+  }
+
   // Owned maps too, which have names of the store's own.
   std::vector<std::string> RootNames() {
     std::vector<std::string> names;
-    State().ScanNamed(NamedTable::kRoots, "", [&](std::string_view name, ByteView) {
-      names.emplace_back(name);
-      return true;
+    AsFarAsReadable([&] {
+      State().ScanNamed(NamedTable::kRoots, "", [&](std::string_view name, ByteView) {
+        names.emplace_back(name);
+        return true;
+      });
     });
     return names;
   }
 
   void CheckNamedValues() {
     for (const NamedTable table : {NamedTable::kInfo, NamedTable::kMeta}) {
-      State().ScanNamed(table, "", [&](std::string_view name, ByteView sealed) {
-        try {
-          OpenNamed(table, name, sealed);
-        } catch (const MalformedBytes& malformed) {
-          Find("", OID(), "named value \"" + std::string(name) + "\": " + malformed.what());
-        }
-        return true;
-      });
+      AsFarAsReadable([&] { CheckNamedValuesOf(table); });
     }
+  }
+
+  void CheckNamedValuesOf(NamedTable table) {
+    State().ScanNamed(table, "", [&](std::string_view name, ByteView sealed) {
+      try {
+        OpenNamed(table, name, sealed);
+      } catch (const MalformedBytes& malformed) {
+        Find("", OID(), "named value \"" + std::string(name) + "\": " + malformed.what());
+      }
+      return true;
+    });
   }
 
   void CheckRoot(const std::string& name) {
@@ -82,16 +117,16 @@ class SpaceCheck {
   // The records that no root reaches: what hangs below the queue of deletions is on its way out, the rest is to be collected.
   void CheckRecords() {
     std::uint64_t total = 0;
-    State().ScanRecords(OID(1), [&](OID, ByteView) { return ++total > 0; });
-    const IdSet awaitingDeletion = ReadQueue();
-    State().ScanRecords(OID(1), [&](OID oid, ByteView record) {
+    ScanReadableRecords([&](OID, ByteView) { ++total; });
+    IdSet awaitingDeletion;
+    AsFarAsReadable([&] { awaitingDeletion = ReadQueue(); });
+    ScanReadableRecords([&](OID oid, ByteView record) {
       if (!m_reached.Contains(oid)) {
         CheckForm(oid, record);
         if (!awaitingDeletion.Contains(oid)) ++m_report.unreachable;
       }
       ++m_report.records;
       if (m_progress) m_progress(m_report.records, total);
-      return true;
     });
   }
 

@@ -25,8 +25,8 @@ struct VerifyReport {
   std::uint64_t unreachable = 0;  // of these, not reached from any root and not queued for deletion: space to be collected
 };
 
-// Checks every record's checksum and form, every map's structure (store/map_check.h), every named value, and counts what no
-// root reaches. Collects every fault; throws only when the engine itself fails. Reads every node of every map once and
+// Checks every record's checksum and form, every map's structure (store/map_check.h), every named value, what the engine
+// keeps them in, and counts what no root reaches. Collects every fault; throws only when the engine itself fails. Reads every node of every map once and
 // keeps none of them: takes the memory of one path from the root, two bits for each record, eight bytes for each
 // queued deletion, and what the findings take. `progress` is told how many of how many records are done.
 VerifyReport VerifySpace(Snapshot& snapshot,

@@ -115,9 +115,11 @@ SealedSpace::Answer SealedSpace::Ask(std::uint64_t transaction, bool mayWait, Kn
 KnownStatePtr SealedSpace::CheckUnsealed(const MetaPage& meta) {
   auto known = std::make_shared<KnownState>(*Read(meta));
   const SpaceState& state = *known->state;
+  if (const std::string fault = FaultOfOtherMeta(state); !fault.empty()) {
+    Throw(fault + " (a meta page of " + kDataFile + " is damaged); restore the space from a backup");
+  }
   const StorageReport report = CheckPages(m_file, state, m_space);
   known->records = report.records;
-  known->doubt = FaultOfOtherMeta(state);
   if (!report.findings.empty()) {
     known->doubt = ToText(report.findings.front());
     if (report.findings.size() > 1) known->doubt += ", and " + std::to_string(report.findings.size() - 1) + " more faults";
@@ -143,7 +145,7 @@ std::string SealedSpace::FaultOfOtherMeta(const SpaceState& state) const {
     const SpaceNumbers numbers = ReadNumbers(reader, state);
     const SpaceNumbers numbersBefore = ReadNumbers(readerBefore, *before);
     if (numbersBefore.generation > numbers.generation || numbersBefore.nextId > numbers.nextId) {
-      return "a newer commit is hidden behind a damaged meta page";
+      return "a newer commit is hidden";
     }
   } catch (const DamagedStorage&) {
     // The pages of older commits may have been used again.

@@ -8,7 +8,8 @@
 // 1. A seal that is newer than the newest commit: a commit was lost, or its meta page is damaged. Nothing is read.
 // 2. A seal that does not match its commit: meta page, main table or list of free pages are damaged. Of the first two
 //    nothing is read; without the last nothing is written.
-// 3. No seal, and a fault is found: nothing is written, and what can be read is.
+// 3. No seal, and a fault is found: nothing is written, and what can be read is; nothing is where the two meta pages
+//    contradict each other.
 //
 // Any thread may call.
 #pragma once

@@ -35,9 +35,9 @@ fs::path ForeignFile(const fs::path& path, const std::string& space) {
   return {};
 }
 
-// Where a commit was sealed, there was a data.mdb with something in it.
+// Where a commit behind the one that makes a space was sealed, there was a data.mdb with something in it.
 void RequireNeverSealed(const fs::path& path, const std::string& space) {
-  if (SealFile(path / kSealFile, space, true).Read().Newest() == 0) return;
+  if (SealFile(path / kSealFile, space, true).Read().Newest() <= 1) return;
   throw DamagedStorage("cannot open " + space + ": its " + kDataFile + " is missing or empty, and " + kSealFile +
                            " tells of commits; restore the space from a backup",
                        {space, "", OID(), "", std::nullopt});
@@ -101,6 +101,8 @@ FolderContents ExamineFolder(const fs::path& path, const std::string& space) {
 void MakeFolder(const fs::path& path, const std::string& space) {
   std::error_code error;
   fs::create_directory(path, error);
+  // A power loss may have kept the seal of a creation and nothing else of it.
+  if (!error) fs::remove(path / kSealFile, error);
   if (error) throw LmdbError("make the folder of", space, error.value());
 }
 

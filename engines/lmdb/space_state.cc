@@ -125,6 +125,20 @@ const PageTable* SpaceState::Table(std::string_view name) const noexcept {
   return found == tables.end() ? nullptr : &*found;
 }
 
+namespace {
+
+// Whether no meta page tells of a commit behind the one that makes a space.
+bool WasNeverCommitted(const std::uint8_t* first, const std::uint8_t* second) noexcept {
+  for (const std::uint8_t* page : {first, second}) {
+    if (page == nullptr) continue;
+    const auto meta = LoadAs<MetaPage>(page + kPageHeaderBytes);
+    if (meta.magic == kLmdbMagic && meta.transaction > 1) return false;
+  }
+  return true;
+}
+
+}  // namespace
+
 HeaderFault FaultOfHeader(PageFile& file) {
   file.Measure();
   const std::uint8_t* first = file.At(0, kPageHeaderBytes + sizeof(MetaPage));
@@ -137,18 +151,19 @@ HeaderFault FaultOfHeader(PageFile& file) {
     // A second meta page at the usual place tells that this was one.
     constexpr std::size_t kUsualPageBytes = 4096;
     const std::uint8_t* other = file.At(kUsualPageBytes, kPageHeaderBytes + sizeof(MetaPage));
-    const bool isForeign = other == nullptr || LoadAs<MetaPage>(other + kPageHeaderBytes).magic != kLmdbMagic;
+    const bool isForeign = other == nullptr || LoadAs<MetaPage>(other + kPageHeaderBytes).magic != kLmdbMagic ||
+                           WasNeverCommitted(nullptr, other);
     return {isForeign ? "it is not a file of LMDB" : "its first meta page is damaged", isForeign};
   }
   if (meta.version != kLmdbVersion) return {"it is of version " + std::to_string(meta.version) + " of LMDB's files, and this program reads version 1", true};
   if (!isPageSize) return {"the page size in its first meta page is impossible"};
-  if (second == nullptr) return {"it is cut off within its meta pages"};
+  if (second == nullptr) return {"it is cut off within its meta pages", WasNeverCommitted(first, nullptr)};
   for (std::uint64_t i = 0; i < kMetaPages; ++i) {
     const PageView page(i == 0 ? first : second);
     const auto one = LoadAs<MetaPage>(page.data() + kPageHeaderBytes);
     if (page.number() != i || page.flags() != kMetaPageFlag || one.magic != kLmdbMagic || one.version != kLmdbVersion ||
         one.address != 0 || one.freePages.pageBytes != pageBytes || one.freePages.flags != kNumberKeys) {
-      return {"its meta page " + std::to_string(i) + " is damaged"};
+      return {"its meta page " + std::to_string(i) + " is damaged", WasNeverCommitted(first, second)};
     }
   }
   return {};

@@ -29,7 +29,7 @@ struct SpaceState {
 };
 
 // What is wrong with the parts of the meta pages that never change; empty for sound ones. `isForeign` tells whether the
-// file is not LMDB's at all, as far as that can be seen.
+// file is not LMDB's at all, or what is left of a creation that a power loss cut off, as far as that can be seen.
 struct HeaderFault {
   std::string fault;
   bool isForeign = false;

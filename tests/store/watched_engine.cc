@@ -30,6 +30,7 @@ class WatchedSnapshot final : public EngineSnapshot {
   std::vector<OID> QueuedDeletions(std::size_t limit) const override {
     return m_inner->QueuedDeletions(limit);
   }
+  std::vector<StorageFinding> CheckStorage() const override { return m_inner->CheckStorage(); }
 
  private:
   std::unique_ptr<EngineSnapshot> m_inner;
