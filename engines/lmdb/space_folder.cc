@@ -101,8 +101,8 @@ FolderContents ExamineFolder(const fs::path& path, const std::string& space) {
 void MakeFolder(const fs::path& path, const std::string& space) {
   std::error_code error;
   fs::create_directory(path, error);
-  // A power loss may have kept the seal of a creation and nothing else of it.
-  if (!error) fs::remove(path / kSealFile, error);
+  // A power loss may have kept the seal of a creation and nothing else of it. The file stays: others may hold its lock.
+  if (!error && fs::exists(path / kSealFile, error)) fs::resize_file(path / kSealFile, 0, error);
   if (error) throw LmdbError("make the folder of", space, error.value());
 }
 

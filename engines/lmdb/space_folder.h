@@ -22,7 +22,7 @@ enum class FolderContents {
 // StoreError when it may not look. `space` is the name for messages.
 FolderContents ExamineFolder(const std::filesystem::path& path, const std::string& space);
 
-// Makes the folder where it is absent, and removes what an interrupted creation has left that would not fit the next one. Throws StoreError, also when its parent is missing.
+// Makes the folder where it is absent, and empties the seal of a creation that was interrupted. Throws StoreError, also when its parent is missing.
 void MakeFolder(const std::filesystem::path& path, const std::string& space);
 
 // Makes the names of new files in `path`, and of `path` itself, survive a power loss.
