@@ -88,8 +88,13 @@ TEST_P(RefreshTest, WithoutANewCommitChangesNothing) {
   Snapshot snapshot(space());
   const auto& map = snapshot.Root<TombstonesMap>("t");
   const auto* payload = map.rFind(Key(10));
+  const std::uint64_t number = PayloadNumber<TombstonesMap::Payload>::Number(*payload);
   snapshot.Refresh();
-  EXPECT_EQ(map.rFind(Key(10)), payload);
+  EXPECT_EQ(PayloadNumber<TombstonesMap::Payload>::Number(*map.rFind(Key(10))), number);
+  // A node that was evicted may be read to another place.
+  if (!Evicts(GetParam())) {
+    EXPECT_EQ(map.rFind(Key(10)), payload);
+  }
 }
 
 // Each commit is compared with its own model, over many of them, in a snapshot that lives through all.
