@@ -62,10 +62,14 @@ SpaceWriter::Table& SpaceWriter::Named(NamedTable table) noexcept {
   return m_meta;
 }
 
-// Whether the key is there.
+// Whether the key is there. Its overflow run is freed with it, and so must be its own.
 bool SpaceWriter::Check(Table& table, std::string_view key) {
   if (!table.cursor.Find(key)) return false;
-  table.cursor.StoredValue();
+  if (table.pages.isTagged) {
+    table.cursor.Value();
+  } else {
+    table.cursor.StoredValue();
+  }
   return true;
 }
 

@@ -3,6 +3,7 @@
 #include <cstring>
 #include <functional>
 #include <stdexcept>
+#include <vector>
 
 #include "engines/lmdb/lmdb_engine.h"
 #include "tests/engines/lmdb_site.h"
@@ -175,6 +176,51 @@ std::size_t StructuralByte(const std::string& data, std::mt19937_64& random) {
   return page + std::min<std::size_t>(offset + random() % 24, kPageBytes - 1);
 }
 
+std::uint64_t NumberAt(const std::string& data, std::size_t at, std::size_t bytes) {
+  std::uint64_t number = 0;
+  std::memcpy(&number, data.data() + at, bytes);
+  return number;
+}
+
+// The places of all page numbers by which pages are reached or given out again, also in pages that are out of use.
+std::vector<std::size_t> ReferencesIn(const std::string& data) {
+  std::vector<std::size_t> places;
+  for (std::size_t page = 0; page + kPageBytes <= data.size(); page += kPageBytes) {
+    const std::uint64_t flags = NumberAt(data, page + 10, 2);
+    if (flags == 8) places.insert(places.end(), {page + 16 + 24 + 40, page + 16 + 72 + 40});
+    if (flags != 1 && flags != 2) continue;
+    const std::uint64_t lower = NumberAt(data, page + 12, 2);
+    for (std::size_t slot = page + 16; slot < page + lower; slot += 2) {
+      const std::size_t node = page + NumberAt(data, slot, 2);
+      const std::size_t value = node + 8 + NumberAt(data, node + 6, 2);
+      const std::uint64_t nodeFlags = NumberAt(data, node + 4, 2);
+      if (flags == 1) places.push_back(node);
+      if (flags == 2 && nodeFlags == 1) places.push_back(value);
+      if (flags == 2 && nodeFlags == 2) places.push_back(value + 40);
+      // The lists of free pages are the values whose keys are small numbers of the machine.
+      const bool isList = flags == 2 && nodeFlags == 0 && value == node + 16 && NumberAt(data, node + 8, 8) < 1000;
+      const std::uint64_t bytes = NumberAt(data, node, 4);
+      for (std::uint64_t i = 8; isList && i + 8 <= bytes; i += 8) places.push_back(value + i);
+    }
+  }
+  return places;
+}
+
+// Makes a reference lead to a page near the right one, often to an older version of it.
+std::string Misdirect(std::string& data, std::mt19937_64& random) {
+  const std::vector<std::size_t> places = ReferencesIn(data);
+  const std::size_t place = places[random() % places.size()];
+  std::uint64_t page = NumberAt(data, place, 6);
+  const std::uint64_t before = page;
+  const std::uint64_t pages = data.size() / kPageBytes;
+  const auto flagsOf = [&](std::uint64_t number) { return number < pages ? NumberAt(data, number * kPageBytes + 10, 2) : 0; };
+  do {
+    page = random() % pages;
+  } while (page == before || (before < pages && random() % 16 != 0 && flagsOf(page) != flagsOf(before)));
+  std::memcpy(data.data() + place, &page, 6);
+  return "page " + std::to_string(page) + " instead of " + std::to_string(before) + " at " + std::to_string(place);
+}
+
 }  // namespace
 
 std::string SealedValue(const std::string& key, std::uint64_t version, std::size_t bytes) {
@@ -261,6 +307,7 @@ std::string Damage(SpaceFiles& files, std::mt19937_64& random) {
     std::memset(files.data.data() + at, 0, bytes);
     return prefix + std::to_string(bytes) + " bytes of data.mdb zeroed at " + std::to_string(at);
   }
+  if (kind > 10) return prefix + Misdirect(files.data, random);
   const std::size_t at = kind < 7 ? random() % files.data.size() : StructuralByte(files.data, random);
   const unsigned bit = random() % 8;
   FlipBit(files.data, at, bit);
