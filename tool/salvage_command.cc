@@ -21,10 +21,13 @@ struct Request {
   std::string destination;
 };
 
+// What the nodes of the space that is made may take in memory.
+constexpr std::uint64_t kCacheBytes = std::uint64_t{64} << 20;
+
 ExitCode RunSalvage(const Request& request) {
   const auto engine = OpenEngineForReading(request.source);
   const auto state = engine->OpenSnapshot();
-  const auto space = CSpace::Open(request.destination, {.create = true});
+  const auto space = CSpace::Open(request.destination, {.create = true, .cacheBytes = kCacheBytes});
   SalvageReport report;
   {
     std::unique_ptr<ProgressBar> bar;

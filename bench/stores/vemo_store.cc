@@ -19,6 +19,7 @@ class VemoStorePeer : public StorePeer {
   explicit VemoStorePeer(const StoreSetup& setup) {
     SpaceOptions options;
     options.create = true;
+    if (setup.cacheBytes > 0) options.cacheBytes = setup.cacheBytes;
     m_space = CSpace::Open("lmdb:" + (setup.folder / "space").string(), options);
   }
 
@@ -28,8 +29,12 @@ class VemoStorePeer : public StorePeer {
   }
   void Put(const FieldId& key, std::size_t payload) override {
     m_map->Insert(key, m_payloads[payload], true);
+    m_transaction->Trim();
   }
-  void Erase(const FieldId& key) override { m_map->Delete(key); }
+  void Erase(const FieldId& key) override {
+    m_map->Delete(key);
+    m_transaction->Trim();
+  }
   void Commit() override {
     m_transaction->Commit();
     m_transaction.reset();
@@ -41,7 +46,9 @@ class VemoStorePeer : public StorePeer {
   }
   std::uint64_t Find(const FieldId& key) override {
     const Payload* payload = m_read->rFind(key);
-    return payload != nullptr ? PayloadKind<Payload>::Read(*payload) : 0;
+    const std::uint64_t answer = payload != nullptr ? PayloadKind<Payload>::Read(*payload) : 0;
+    m_snapshot->Trim();  // does nothing without a budget
+    return answer;
   }
   std::uint64_t Scan() override {
     std::uint64_t sum = 0;
@@ -61,7 +68,7 @@ class VemoStorePeer : public StorePeer {
 }  // namespace
 
 StoreKind VemoStore() {
-  return {"vemo", StoreRole::kStore, false, [](const StoreSetup& setup) -> std::unique_ptr<StorePeer> {
+  return {"vemo", StoreRole::kStore, true, [](const StoreSetup& setup) -> std::unique_ptr<StorePeer> {
             if (setup.payload == StorePayload::kTombstones)
               return std::make_unique<VemoStorePeer<FieldIdToVectorTombstonesMap>>(setup);
             return std::make_unique<VemoStorePeer<FieldIdToVectorInsertionsMap>>(setup);
