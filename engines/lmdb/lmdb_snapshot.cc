@@ -25,20 +25,10 @@ OID ToOid(const TreeCursor& cursor) {
 
 LmdbSnapshot::LmdbSnapshot(std::shared_ptr<LmdbEnvironment> environment)
     : m_environment(std::move(environment)),
-      m_reading(m_environment->BeginSnapshot()),
-      m_reader(MakeReader(m_reading.known->file, State(), m_environment->name())),
-      m_records(m_reader, Table(kRecordsTable)) {
-  try {
-    m_generation = ReadGeneration(m_reader, State());
-  } catch (...) {
-    m_environment->EndSnapshot(m_reading);
-    throw;
-  }
-}
-
-LmdbSnapshot::~LmdbSnapshot() {
-  m_environment->EndSnapshot(m_reading);
-}
+      m_reading(*m_environment),
+      m_reader(MakeReader(m_reading.Known().file, State(), m_environment->name())),
+      m_records(m_reader, Table(kRecordsTable)),
+      m_generation(ReadGeneration(m_reader, State())) {}
 
 std::optional<ByteView> LmdbSnapshot::Read(OID oid) const {
   m_environment->RequireOwnProcess(kOperation);
@@ -83,8 +73,8 @@ std::vector<OID> LmdbSnapshot::QueuedDeletions(std::size_t limit) const {
 std::vector<StorageFinding> LmdbSnapshot::CheckStorage() const {
   m_environment->RequireOwnProcess("check");
   std::vector<StorageFinding> findings =
-      CheckPages(m_reading.known->file, State(), m_environment->name()).findings;
-  if (findings.empty() && !m_reading.known->doubt.empty()) findings.push_back({m_reading.known->doubt, std::nullopt});
+      CheckPages(m_reading.Known().file, State(), m_environment->name()).findings;
+  if (findings.empty() && !m_reading.Known().doubt.empty()) findings.push_back({m_reading.Known().doubt, std::nullopt});
   return findings;
 }
 

@@ -9,12 +9,27 @@
 
 namespace vemo {
 
+// A read of the environment that ends with this object, whatever else fails.
+class OpenReading {
+ public:
+  explicit OpenReading(LmdbEnvironment& environment)
+      : m_environment(environment), m_reading(environment.BeginSnapshot()) {}
+  ~OpenReading() { m_environment.EndSnapshot(m_reading); }
+  OpenReading(const OpenReading&) = delete;
+  OpenReading& operator=(const OpenReading&) = delete;
+
+  const KnownState& Known() const noexcept { return *m_reading.known; }
+
+ private:
+  LmdbEnvironment& m_environment;
+  const LmdbEnvironment::Reading m_reading;
+};
+
 // Reads without LMDB (page_reader.h), whose transaction keeps the pages. Views point into the map of data.mdb, which
 // stays while the snapshot is open.
 class LmdbSnapshot final : public EngineSnapshot {
  public:
   explicit LmdbSnapshot(std::shared_ptr<LmdbEnvironment> environment);
-  ~LmdbSnapshot() override;
   LmdbSnapshot(const LmdbSnapshot&) = delete;
   LmdbSnapshot& operator=(const LmdbSnapshot&) = delete;
 
@@ -28,13 +43,13 @@ class LmdbSnapshot final : public EngineSnapshot {
   std::vector<StorageFinding> CheckStorage() const override;
 
  private:
-  const SpaceState& State() const noexcept { return *m_reading.known->state; }
+  const SpaceState& State() const noexcept { return *m_reading.Known().state; }
   const PageTable& Table(std::string_view name) const noexcept { return *State().Table(name); }
   void Scan(std::string_view table, std::string_view first,
             const std::function<bool(TreeCursor&)>& visit) const;
 
   std::shared_ptr<LmdbEnvironment> m_environment;
-  LmdbEnvironment::Reading m_reading;
+  OpenReading m_reading;
   mutable PageReader m_reader;  // remembers the pages that it has checked
   mutable TreeCursor m_records;
   std::uint64_t m_generation = 0;
