@@ -48,7 +48,8 @@ struct SalvageOptions {
 //
 // Leaves below a node that is lost are reached along the chain of leaves, from both sides and across lost leaves. A map whose own
 // record is lost is put together from chains of leaves; where these cannot be told apart, each becomes a root "salvaged/leaf
-// ID" of its own, and a map whose name is lost becomes "salvaged/map ID".
+// ID" of its own, and a map whose name is lost becomes "salvaged/map ID". Leaves of a tree that was cleared and awaits deletion may
+// then be taken for the map's: entries that were deleted can come back where the map's own record is lost, and only there.
 //
 // Reads the source alone; throws UsageError when the destination is not empty, and what its engine throws. Faults of the
 // source's engine are losses. Memory: a few bits for each id, some bytes for each lost object, one batch of the
