@@ -43,7 +43,7 @@ class Rescue {
     FindRootsByRemains();
     for (const Root& root : m_roots) SaveMap(root);
     for (const OID oid : UnclaimedMaps()) SaveNamelessMap(oid);
-    m_walk.FillGaps();
+    for (const LeafChain& chain : m_walk.FillGaps()) SaveHomelessChain(chain);
     SaveLostMaps();
     SaveMeta();
     m_sink.Commit();
@@ -190,7 +190,8 @@ class Rescue {
   }
 
   // Maps whose own records are lost: put together from chains of leaves. One lost map of a family gets the newest leaves, and
-  // others that do not overlap with them: a tree that was replaced by another was written before it.
+  // others that can be of their tree: a tree that was replaced by another was written before it. Where it is not known which
+  // leaves await deletion, none is a map's without doubt.
   void SaveLostMaps() {
     if (m_lost.empty()) return;
     std::vector<LeafChain> chains = m_walk.FindChains();
@@ -199,17 +200,21 @@ class Rescue {
       const auto isOfFamily = [&root](const Root& other) { return !other.family || *other.family == *root.family; };
       const bool isOnly = std::count_if(m_lost.begin(), m_lost.end(), isOfFamily) == 1;
       OpenMap(root.name, root.oid, *root.family);
-      if (isOnly) m_walk.SaveChains(root.name, *root.family, chains);
+      if (isOnly && m_source.KnowsAllDeletions()) m_walk.SaveChains(root.name, *root.family, chains);
       CloseMap();
     }
     for (const LeafChain& chain : chains) {
-      if (chain.isSaved) continue;
-      const std::string name = FreeName("salvaged/leaf " + std::to_string(chain.head.m_value));
-      Lose({}, chain.head, "to which root this leaf and those behind it belong; they are \"" + name + "\" now");
-      OpenMap(name, OID(), chain.family);
-      m_walk.SaveChain(name, chain);
-      CloseMap();
+      if (!chain.isSaved) SaveHomelessChain(chain);
     }
+  }
+
+  void SaveHomelessChain(const LeafChain& chain) {
+    const std::string name = FreeName("salvaged/leaf " + std::to_string(chain.head.m_value));
+    const std::string_view doubt = m_source.KnowsAllDeletions() ? "" : ", and whether they were deleted";
+    Lose({}, chain.head, "to which root this leaf and those behind it belong" + std::string(doubt) + "; they are \"" + name + "\" now");
+    OpenMap(name, OID(), chain.family);
+    m_walk.SaveChain(name, chain);
+    CloseMap();
   }
 
   void OpenMap(const std::string& name, OID oid, RawFamily family) {

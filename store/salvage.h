@@ -48,8 +48,14 @@ struct SalvageOptions {
 //
 // Leaves below a node that is lost are reached along the chain of leaves, from both sides and across lost leaves. A map whose own
 // record is lost is put together from chains of leaves; where these cannot be told apart, each becomes a root "salvaged/leaf
-// ID" of its own, and a map whose name is lost becomes "salvaged/map ID". Leaves of a tree that was cleared and awaits deletion may
-// then be taken for the map's: entries that were deleted can come back where the map's own record is lost, and only there.
+// ID" of its own, and a map whose name is lost becomes "salvaged/map ID".
+//
+// What was deleted stays away as far as that can be told:
+// - Leaves in or below the queue of deletions are left out. Where the queue, or a node in it or below it, cannot be read, leaves that
+//   nothing leads to get no map's name but become "salvaged/leaf ID", and the loss says that they may have been deleted.
+// - An assignment leaves the old tree behind, in no queue. Where the map's own record is lost, the old tree is taken for the
+//   map's if the new one is empty; and where the map's record or a node of its tree is lost, so are parts of an old tree that have
+//   lost both their neighbours and have no keys in common with what was found.
 //
 // Reads the source alone; throws UsageError when the destination is not empty, and what its engine throws. Faults of the
 // source's engine are losses. Memory: a few bits for each id, some bytes for each lost object, one batch of the

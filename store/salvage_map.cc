@@ -16,9 +16,10 @@ const FieldId& FirstKey(const SoundRecord& leaf) { return leaf.body.leafEntries.
 const FieldId& LastKey(const SoundRecord& leaf) { return leaf.body.leafEntries.back().key; }
 bool IsEmpty(const SoundRecord& leaf) { return leaf.body.leafEntries.empty(); }
 
-// Whether two chains have keys in a common range.
-bool Overlap(const LeafChain& a, const LeafChain& b) {
-  return a.first && b.first && !(*a.last < *b.first) && !(*b.last < *a.first);
+// Whether two chains cannot be of one tree: they have keys in a common range, or both an end of the tree.
+bool AreOfTwoTrees(const LeafChain& a, const LeafChain& b) {
+  const bool overlap = a.first && b.first && !(*a.last < *b.first) && !(*b.last < *a.first);
+  return overlap || (a.hasFirstLeaf && b.hasFirstLeaf) || (a.hasLastLeaf && b.hasLastLeaf);
 }
 
 }  // namespace
@@ -149,7 +150,10 @@ std::vector<LeafChain> SalvageMapWalk::FindChains() const {
     for (OID oid = head; !oid.IsNull() && !m_claimed.Contains(oid) && seen.Insert(oid);) {
       const std::optional<SoundRecord> leaf = m_source.Read(oid);
       if (!leaf || leaf->rawClass.kind != RawKind::kLeaf) break;
-      if (isFirst) chain.family = leaf->rawClass.family;
+      if (isFirst) {
+        chain.family = leaf->rawClass.family;
+        chain.hasFirstLeaf = leaf->body.previous.IsNull();
+      }
       if (leaf->rawClass.family != chain.family) break;
       isFirst = false;
       chain.commit = std::max(chain.commit, leaf->commit);
@@ -158,6 +162,7 @@ std::vector<LeafChain> SalvageMapWalk::FindChains() const {
         chain.last = LastKey(*leaf);
       }
       oid = leaf->body.next;
+      chain.hasLastLeaf = oid.IsNull();
     }
     if (!isFirst) chains.push_back(std::move(chain));
   }
@@ -168,8 +173,8 @@ std::vector<LeafChain> SalvageMapWalk::FindChains() const {
 void SalvageMapWalk::SaveChains(const std::string& root, RawFamily family, std::vector<LeafChain>& chains) {
   std::vector<const LeafChain*> saved;
   for (LeafChain& chain : chains) {
-    const auto overlaps = [&chain](const LeafChain* other) { return Overlap(*other, chain); };
-    if (chain.isSaved || chain.family != family || std::any_of(saved.begin(), saved.end(), overlaps)) continue;
+    const auto isOfAnother = [&chain](const LeafChain* other) { return AreOfTwoTrees(*other, chain); };
+    if (chain.isSaved || chain.family != family || std::any_of(saved.begin(), saved.end(), isOfAnother)) continue;
     SaveChain(root, chain);
     chain.isSaved = true;
     saved.push_back(&chain);
@@ -191,15 +196,19 @@ void SalvageMapWalk::SaveChain(const std::string& root, const LeafChain& chain) 
   }
 }
 
-void SalvageMapWalk::FillGaps() {
-  for (const LeafChain& chain : FindChains()) {
+std::vector<LeafChain> SalvageMapWalk::FillGaps() {
+  std::vector<LeafChain> doubtful;
+  for (LeafChain& chain : FindChains()) {
     const auto fits = [&chain](const Gap& gap) {
       return gap.family == chain.family && chain.first && IsAtLeast(*chain.first, gap.low) && IsBelow(*chain.last, gap.high);
     };
     const auto gap = std::find_if(m_gaps.begin(), m_gaps.end(), fits);
-    const std::optional<SoundRecord> head = m_source.Read(chain.head);
-    // A tree that was replaced has a first leaf; a part of one that lost nodes has not.
-    if (gap == m_gaps.end() || !head || head->body.previous.IsNull()) continue;
+    // The ends of a tree with a map are reached from the map, so a chain that has an end is of a tree that was replaced.
+    if (gap == m_gaps.end() || chain.hasFirstLeaf || chain.hasLastLeaf) continue;
+    if (!m_source.KnowsAllDeletions()) {
+      doubtful.push_back(std::move(chain));
+      continue;
+    }
     m_sink.OpenMap(gap->root, gap->map, gap->family);
     SaveChain(gap->root, chain);
     for (SalvageReport::Map& map : m_report.maps) {
@@ -207,6 +216,7 @@ void SalvageMapWalk::FillGaps() {
     }
     m_report.entries += m_sink.EntriesOfMap();
   }
+  return doubtful;
 }
 
 }  // namespace vemo

@@ -20,6 +20,7 @@ struct LeafChain {
   RawFamily family = RawFamily::kInsertions;
   std::uint64_t commit = 0;  // the newest that wrote one of the leaves
   std::optional<FieldId> first, last;  // keys; nothing where there are no entries
+  bool hasFirstLeaf = false, hasLastLeaf = false;  // of its tree, which has one of each
   bool isSaved = false;
 };
 
@@ -36,12 +37,13 @@ class SalvageMapWalk {
 
   // Copies the tree of a map whose own record is sound. The sink has the map open.
   void SaveTree(const std::string& root, OID oid, RawFamily family, const RawBody& map);
-  // Looks among the leaves that nothing led to for those that fit into the holes of the trees that were walked.
-  void FillGaps();
+  // Looks among the leaves that nothing led to for those that fit into the holes of the trees that were walked, and copies them.
+  // Where it is not known which leaves await deletion, they are not copied but returned.
+  std::vector<LeafChain> FillGaps();
 
   // The chains of the leaves that nothing has led to.
   std::vector<LeafChain> FindChains() const;
-  // Copies chains of the family, the newest first, that do not overlap in their keys.
+  // Copies chains of the family, the newest first, that can be parts of one tree.
   void SaveChains(const std::string& root, RawFamily family, std::vector<LeafChain>& chains);
   void SaveChain(const std::string& root, const LeafChain& chain);
 

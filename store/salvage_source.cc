@@ -25,21 +25,39 @@ void SalvageSource::Survey() {
   FindBreaks();
 }
 
+// A leaf in use names leaves in use alone, so whatever is chained to one that awaits deletion awaits it too. That finds the leaves
+// below a queued node that cannot be read, where a leaf beside them hangs below another.
 void SalvageSource::ReadQueue() {
   std::vector<OID> pending;
   try {
     pending = m_state.QueuedDeletions(SIZE_MAX);
   } catch (const StoreError& error) {
     m_damaged.push_back({OID(), std::string("the queue of deletions: ") + error.what()});
+    m_knowsAllDeletions = false;
   }
   while (!pending.empty()) {
     const OID oid = pending.back();
     pending.pop_back();
     if (!m_awaitingDeletion.Insert(oid)) continue;
-    if (const std::optional<SoundRecord> record = Read(oid)) {
-      pending.insert(pending.end(), record->body.children.begin(), record->body.children.end());
+    std::string fault;
+    if (!ReadOrFault(m_state, oid, fault) && fault.empty()) continue;  // it has left already
+    const std::optional<SoundRecord> record = Read(oid);
+    if (!record) {
+      m_knowsAllDeletions = false;
+      continue;
+    }
+    pending.insert(pending.end(), record->body.children.begin(), record->body.children.end());
+    if (!record->body.root.IsNull()) pending.push_back(record->body.root);
+    for (const OID neighbour : {record->body.previous, record->body.next}) {
+      if (IsLeaf(neighbour) && IsChained(neighbour, oid)) pending.push_back(neighbour);
     }
   }
+}
+
+// A leaf that was merged away names neighbours that have forgotten it.
+bool SalvageSource::IsChained(OID leaf, OID neighbour) const {
+  const std::optional<SoundRecord> record = Read(leaf);
+  return record && (record->body.previous == neighbour || record->body.next == neighbour);
 }
 
 void SalvageSource::FindBreaks() {

@@ -50,7 +50,10 @@ class SalvageSource {
   // leaf does. What awaits deletion has such neighbours by right, and is left out.
   OID LeafAfter(OID lost) const { return Lookup(m_leafAfter, lost); }
   OID LeafBefore(OID lost) const { return Lookup(m_leafBefore, lost); }
+  // Whether the object is queued for deletion, hangs below one that is, or is a leaf of the same chain as one that does.
   bool IsAwaitingDeletion(OID oid) const noexcept { return m_awaitingDeletion.Contains(oid); }
+  // False where the queue, or a record in or below it, cannot be read: what hangs there is then not known to await deletion.
+  bool KnowsAllDeletions() const noexcept { return m_knowsAllDeletions; }
 
   // The leaves without a readable one before them, ascending: where chains begin.
   const std::vector<OID>& heads() const noexcept { return m_heads; }
@@ -64,6 +67,7 @@ class SalvageSource {
   SoundRecord Open(OID oid, ByteView record) const;
   SoundRecord OpenLeafOfUnknownClass(const RawEnvelope& envelope) const;
   void ReadQueue();
+  bool IsChained(OID leaf, OID neighbour) const;
   void FindBreaks();
   bool IsLeaf(OID oid) const { return m_soundLeaves.Contains(oid); }
 
@@ -77,6 +81,7 @@ class SalvageSource {
   std::unordered_map<OID, OID> m_leafAfter;  // as many as there are lost leaves
   std::unordered_map<OID, OID> m_leafBefore;
   std::uint64_t m_leaves = 0;
+  bool m_knowsAllDeletions = true;
   OID m_largestId;
 };
 

@@ -220,6 +220,22 @@ TEST_P(SalvageTest, TakesTheNewerTreeWhereALostMapHadBeenReplaced) {
       << "the older tree is not thrown away: nothing tells for certain whose it was";
 }
 
+TEST_P(SalvageTest, TakesNoPartOfAnOlderTreeWhereALostMapHadBeenReplacedByOneOfOtherKeys) {
+  {
+    WriteTransaction transaction(space());
+    TombstonesMap fresh;
+    Fill(fresh, kKeys + 1, kKeys + 300);
+    transaction.Root<TombstonesMap>("t") = fresh;
+    transaction.Commit();
+  }
+  site.Tamper(m_map, std::nullopt);
+  for (const bool isBroken : {false, true}) {
+    if (isBroken) Damage(m_leaves[80]);
+    Rescue();
+    EXPECT_EQ(Rescued<TombstonesMap>("t"), NumbersFrom(kKeys + 1, kKeys + 300));
+  }
+}
+
 TEST_P(SalvageTest, KeepsTheLeavesOfSeveralLostMapsApart) {
   CommitFilled<TombstonesMap>(space(), "u", 130);
   const auto [map, leaf] = InSnapshot(space(), [](Snapshot& snapshot) {
@@ -293,6 +309,81 @@ TEST_P(SalvageTest, WhatAwaitsDeletionIsNotBroughtBack) {
   Rescue();
   EXPECT_EQ(Rescued<TombstonesMap>("t"), Numbers());
   EXPECT_EQ(m_report.maps.size(), 4u);
+}
+
+class SalvageOfQueueTest : public SalvageTest {
+ protected:
+  // "t" is cleared, and its tree is queued where it hung from the root node.
+  SalvageOfQueueTest() {
+    site.Reopen();
+    {
+      WriteTransaction transaction(space());
+      transaction.Root<TombstonesMap>("t").clear();
+      transaction.Commit();
+    }
+    m_stored = Stored();
+  }
+  bool IsQueued(OID oid) const { return std::find(m_stored.queue.begin(), m_stored.queue.end(), oid) != m_stored.queue.end(); }
+};
+INSTANTIATE_STORE_TEST(SalvageOfQueueTest);
+
+TEST_P(SalvageOfQueueTest, LeavesBelowAQueuedNodeThatIsDamagedAreKnownByTheirNeighbours) {
+  site.Tamper(m_map, std::nullopt);
+  std::size_t tried = 0;
+  for (const OID oid : m_inner) {
+    if (!IsQueued(oid)) continue;
+    Damage(oid);
+    Rescue();
+    EXPECT_EQ(Rescued<TombstonesMap>("t"), Numbers());
+    EXPECT_EQ(m_report.maps.size(), 4u);
+    LossOf(oid);
+    site.Tamper(oid, m_stored.records.at(oid));
+    ++tried;
+  }
+  EXPECT_GE(tried, 2u);
+}
+
+TEST_P(SalvageOfQueueTest, LeavesThatMayHaveBeenDeletedGetNoMapsName) {
+  site.Tamper(m_map, std::nullopt);
+  for (const OID oid : m_stored.queue) Damage(oid);
+  Rescue();
+  EXPECT_EQ(Rescued<TombstonesMap>("t"), Numbers());
+  ExpectTheRestIsThere();
+  const auto isLeft = [this](OID leaf) { return m_stored.records.contains(leaf) && !IsQueued(leaf); };
+  const auto head = std::find_if(m_leaves.begin(), m_leaves.end(), isLeft);
+  ASSERT_NE(head, m_leaves.end());
+  const SalvageLoss* loss = LossOf(*head);
+  ASSERT_NE(loss, nullptr);
+  EXPECT_NE(loss->what.find("whether they were deleted"), std::string::npos) << loss->what;
+  EXPECT_FALSE(Rescued<TombstonesMap>("salvaged/leaf " + std::to_string(head->m_value)).empty());
+}
+
+TEST_P(SalvageOfQueueTest, LeavesThatMayHaveBeenDeletedFillNoHoleOfAnotherMap) {
+  CommitFilled<TombstonesMap>(space(), "u", 600);
+  std::vector<OID> leaves;
+  OID root;
+  {
+    Snapshot snapshot(space());
+    const auto& map = snapshot.Root<TombstonesMap>("u");
+    root = map.m_root.m_oid;
+    for (const auto* leaf = map.m_firstLeaf.Get(); leaf != nullptr; leaf = leaf->m_next.Get())
+      leaves.push_back(leaf->GetPersistObjState().m_oid);
+  }
+  m_stored = Stored();
+  ASSERT_FALSE(m_stored.queue.empty());
+  for (const OID oid : {root, leaves[2], leaves[3], leaves[6], leaves[7]}) Damage(oid);
+  Numbers expected = NumbersFrom(1, FirstKeyOf(2) - 1);
+  expected.merge(NumbersFrom(FirstKeyOf(4), FirstKeyOf(6) - 1));
+  expected.merge(NumbersFrom(FirstKeyOf(8), 600));
+  Rescue();
+  EXPECT_EQ(Rescued<TombstonesMap>("u"), expected);
+
+  for (const OID oid : m_stored.queue) Damage(oid);
+  Rescue();
+  for (std::uint64_t n = FirstKeyOf(4); n < FirstKeyOf(6); ++n) expected.erase(n);
+  EXPECT_EQ(Rescued<TombstonesMap>("u"), expected);
+  EXPECT_EQ(Rescued<TombstonesMap>("salvaged/leaf " + std::to_string(leaves[4].m_value)),
+            NumbersFrom(FirstKeyOf(4), FirstKeyOf(6) - 1));
 }
 
 }  // namespace
