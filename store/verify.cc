@@ -139,6 +139,10 @@ class SpaceCheck {
       pending.pop_back();
       const std::optional<ByteView> record = State().Read(oid);
       if (!record || !ids.Insert(oid)) continue;
+      if (m_reached.Contains(oid)) {
+        Find("", oid, "it awaits deletion, and a root map reaches it");
+        continue;
+      }
       const DecodedObject object = CheckForm(oid, *record);
       if (object.Get().m_self == nullptr) continue;
       for (const prefbase& child : OwnedReferences(object.Get())) pending.push_back(child.m_oid);

@@ -240,6 +240,12 @@ TEST_P(RawCheckTest, FindsAnObjectThatIsInUseAndAwaitsDeletion) {
   const RawCheckReport report = Check();
   ASSERT_EQ(report.findings.size(), 1u);
   EXPECT_EQ(report.findings.front().oid, m_leaves[1]);
+  Snapshot snapshot(space());
+  const VerifyReport other = VerifySpace(snapshot);
+  ASSERT_EQ(other.findings.size(), 1u);
+  EXPECT_EQ(other.findings.front().oid, m_leaves[1]);
+  EXPECT_EQ(other.findings.front().fault, report.findings.front().fault);
+  EXPECT_EQ(other.unreachable, report.unreachable);
 }
 
 }  // namespace
