@@ -164,15 +164,29 @@ void ReadLeaf(Cursor& cursor, RawBody& body, RawFamily family) {
   }
 }
 
-// What stands before the checksum.
+bool HasChecksum(ByteView bytes, std::uint64_t seed) {
+  if (bytes.size() <= kChecksumBytes) return false;
+  const std::size_t length = bytes.size() - kChecksumBytes;
+  return XXH3_64bits_withSeed(bytes.data(), length, seed) == LittleEndian(bytes.data() + length);
+}
+
+// What stands between format and checksum.
 ByteView Unseal(ByteView bytes, std::uint64_t seed) {
   if (bytes.size() <= kChecksumBytes) throw RawFault(0, "too few bytes for a format and a checksum");
   const ByteView sealed = bytes.first(bytes.size() - kChecksumBytes);
-  if (XXH3_64bits_withSeed(sealed.data(), sealed.size(), seed) != LittleEndian(bytes.data() + sealed.size())) {
-    throw RawFault(sealed.size(), "a checksum that does not match");
-  }
+  if (!HasChecksum(bytes, seed)) throw RawFault(sealed.size(), "a checksum that does not match");
   if (sealed[0] != kFormat) throw RawFault(0, "format " + std::to_string(sealed[0]) + " is not known");
   return sealed.subspan(1);
+}
+
+RawEnvelope ReadEnvelope(ByteView bytes) {
+  Cursor cursor(bytes);
+  RawEnvelope envelope;
+  envelope.classNumber = cursor.Number32();
+  envelope.commit = cursor.Fixed64();
+  envelope.body = cursor.Rest();
+  envelope.bodyOffset = 1 + cursor.offset();
+  return envelope;
 }
 
 }  // namespace
@@ -191,15 +205,14 @@ std::optional<RawClass> FindRawClass(std::string_view name) {
   return std::nullopt;
 }
 
-RawEnvelope OpenRawRecord(ByteView bytes, OID oid) {
-  Cursor cursor(Unseal(bytes, oid.m_value));
-  RawEnvelope envelope;
-  envelope.classNumber = cursor.Number32();
-  envelope.commit = cursor.Fixed64();
-  envelope.body = cursor.Rest();
-  envelope.bodyOffset = 1 + cursor.offset();
-  return envelope;
+RawEnvelope OpenRawRecord(ByteView bytes, OID oid) { return ReadEnvelope(Unseal(bytes, oid.m_value)); }
+
+RawEnvelope ReadRemainsOfRecord(ByteView bytes) {
+  if (bytes.size() <= kChecksumBytes) throw RawFault(0, "too few bytes for a format and a checksum");
+  return ReadEnvelope(bytes.first(bytes.size() - kChecksumBytes).subspan(1));
 }
+
+bool IsSealedFor(ByteView bytes, OID oid) { return HasChecksum(bytes, oid.m_value); }
 
 ByteView OpenRawNamed(NamedTable table, std::string_view name, ByteView bytes) {
   return Unseal(bytes, XXH3_64bits_withSeed(name.data(), name.size(), static_cast<std::uint64_t>(table)));

@@ -69,6 +69,10 @@ struct RawBody {
 
 // Throws RawFault unless the bytes are what was sealed for `oid`.
 RawEnvelope OpenRawRecord(ByteView bytes, OID oid);
+// The same of bytes that are damaged: does not look at format and checksum, so what it returns need not be what was written.
+RawEnvelope ReadRemainsOfRecord(ByteView bytes);
+// Whether the checksum is that of a record of `oid`.
+bool IsSealedFor(ByteView bytes, OID oid);
 ByteView OpenRawNamed(NamedTable table, std::string_view name, ByteView bytes);
 
 // Throws RawFault unless the body is of that class, from the first byte to the last.

@@ -189,18 +189,17 @@ class Rescue {
     CloseMap();
   }
 
-  // Maps whose own records are lost: put together from chains of leaves. One lost map of a family gets the newest leaves, and
-  // others that can be of their tree: a tree that was replaced by another was written before it. Where it is not known which
-  // leaves await deletion, none is a map's without doubt.
+  // Maps whose own records are lost: put together from chains of leaves, as far as what is left of the record names their ends.
+  // Nothing else tells a map's leaves from those of a tree that was replaced.
   void SaveLostMaps() {
     if (m_lost.empty()) return;
     std::vector<LeafChain> chains = m_walk.FindChains();
     for (const Root& root : m_lost) {
       if (!root.family) continue;
-      const auto isOfFamily = [&root](const Root& other) { return !other.family || *other.family == *root.family; };
-      const bool isOnly = std::count_if(m_lost.begin(), m_lost.end(), isOfFamily) == 1;
       OpenMap(root.name, root.oid, *root.family);
-      if (isOnly && m_source.KnowsAllDeletions()) m_walk.SaveChains(root.name, *root.family, chains);
+      const std::optional<RawBody> remains =
+          root.oid.IsNull() ? std::nullopt : m_source.RemainsOfMap(root.oid, *root.family);
+      if (remains) m_walk.SaveChains(root.name, *root.family, *remains, chains);
       CloseMap();
     }
     for (const LeafChain& chain : chains) {
@@ -210,8 +209,8 @@ class Rescue {
 
   void SaveHomelessChain(const LeafChain& chain) {
     const std::string name = FreeName("salvaged/leaf " + std::to_string(chain.head.m_value));
-    const std::string_view doubt = m_source.KnowsAllDeletions() ? "" : ", and whether they were deleted";
-    Lose({}, chain.head, "to which root this leaf and those behind it belong" + std::string(doubt) + "; they are \"" + name + "\" now");
+    const std::string_view doubt = m_source.KnowsAllDeletions() ? "replaced" : "replaced or deleted";
+    Lose({}, chain.head, "to which root this leaf and those behind it belong, if they were not " + std::string(doubt) + "; they are \"" + name + "\" now");
     OpenMap(name, OID(), chain.family);
     m_walk.SaveChain(name, chain);
     CloseMap();

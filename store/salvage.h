@@ -47,15 +47,15 @@ struct SalvageOptions {
 // root's name, owned maps under their ids, and meta values. The trees are built anew, so the destination passes every check.
 //
 // Leaves below a node that is lost are reached along the chain of leaves, from both sides and across lost leaves. A map whose own
-// record is lost is put together from chains of leaves; where these cannot be told apart, each becomes a root "salvaged/leaf
-// ID" of its own, and a map whose name is lost becomes "salvaged/map ID".
+// record is lost is put together from chains of leaves, where what is left of the record names their ends. Other chains that
+// nothing leads to become roots "salvaged/leaf ID", and a map whose name is lost becomes "salvaged/map ID".
 //
-// What was deleted stays away as far as that can be told:
-// - Leaves in or below the queue of deletions are left out. Where the queue, or a node in it or below it, cannot be read, leaves that
-//   nothing leads to get no map's name but become "salvaged/leaf ID", and the loss says that they may have been deleted.
-// - An assignment leaves the old tree behind, in no queue. Where the map's own record is lost, the old tree is taken for the
-//   map's if the new one is empty; and where the map's record or a node of its tree is lost, so are parts of an old tree that have
-//   lost both their neighbours and have no keys in common with what was found.
+// What was deleted or replaced stays away from the maps' names as far as that can be told:
+// - Leaves in or below the queue of deletions are left out. Where the queue, or a node in it or below it, cannot be read, chains
+//   that nothing leads to may have hung there, and what says that they are "salvaged/leaf ID" now says so.
+// - An assignment leaves the old tree behind, in no queue. Parts of it that have lost the leaves on both their sides can be taken
+//   for a map's whose own record, or a node of whose tree, is lost besides, if they have no keys in common with what was found of
+//   it.
 //
 // Reads the source alone; throws UsageError when the destination is not empty, and what its engine throws. Faults of the
 // source's engine are losses. Memory: a few bits for each id, some bytes for each lost object, one batch of the

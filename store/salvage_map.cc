@@ -161,6 +161,7 @@ std::vector<LeafChain> SalvageMapWalk::FindChains() const {
         if (!chain.first) chain.first = FirstKey(*leaf);
         chain.last = LastKey(*leaf);
       }
+      chain.tail = oid;
       oid = leaf->body.next;
       chain.hasLastLeaf = oid.IsNull();
     }
@@ -170,15 +171,28 @@ std::vector<LeafChain> SalvageMapWalk::FindChains() const {
   return chains;
 }
 
-void SalvageMapWalk::SaveChains(const std::string& root, RawFamily family, std::vector<LeafChain>& chains) {
+void SalvageMapWalk::SaveChains(const std::string& root, RawFamily family, const RawBody& remains,
+                                std::vector<LeafChain>& chains) {
   std::vector<const LeafChain*> saved;
-  for (LeafChain& chain : chains) {
-    const auto isOfAnother = [&chain](const LeafChain* other) { return AreOfTwoTrees(*other, chain); };
-    if (chain.isSaved || chain.family != family || std::any_of(saved.begin(), saved.end(), isOfAnother)) continue;
-    SaveChain(root, chain);
-    chain.isSaved = true;
-    saved.push_back(&chain);
-  }
+  const auto isNamed = [&remains](const LeafChain& chain) {
+    return (chain.hasFirstLeaf || chain.hasLastLeaf) && (!chain.hasFirstLeaf || chain.head == remains.firstLeaf) &&
+           (!chain.hasLastLeaf || chain.tail == remains.lastLeaf);
+  };
+  const auto canBeBetween = [this](const LeafChain& chain) {
+    return !chain.hasFirstLeaf && !chain.hasLastLeaf && m_source.KnowsAllDeletions();
+  };
+  const auto save = [&](const auto& isWanted) {
+    for (LeafChain& chain : chains) {
+      const auto isOfAnother = [&chain](const LeafChain* other) { return AreOfTwoTrees(*other, chain); };
+      if (chain.isSaved || chain.family != family || !isWanted(chain)) continue;
+      if (std::any_of(saved.begin(), saved.end(), isOfAnother)) continue;
+      SaveChain(root, chain);
+      chain.isSaved = true;
+      saved.push_back(&chain);
+    }
+  };
+  save(isNamed);
+  if (!saved.empty()) save(canBeBetween);
 }
 
 void SalvageMapWalk::SaveChain(const std::string& root, const LeafChain& chain) {

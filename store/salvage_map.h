@@ -16,7 +16,7 @@ namespace vemo {
 
 // Leaves that name one another, from one without a readable leaf before it on.
 struct LeafChain {
-  OID head;
+  OID head, tail;
   RawFamily family = RawFamily::kInsertions;
   std::uint64_t commit = 0;  // the newest that wrote one of the leaves
   std::optional<FieldId> first, last;  // keys; nothing where there are no entries
@@ -43,8 +43,9 @@ class SalvageMapWalk {
 
   // The chains of the leaves that nothing has led to.
   std::vector<LeafChain> FindChains() const;
-  // Copies chains of the family, the newest first, that can be parts of one tree.
-  void SaveChains(const std::string& root, RawFamily family, std::vector<LeafChain>& chains);
+  // Copies the chains whose ends are those that the remains of a map's record name, and then those that can be parts of the same
+  // tree.
+  void SaveChains(const std::string& root, RawFamily family, const RawBody& remains, std::vector<LeafChain>& chains);
   void SaveChain(const std::string& root, const LeafChain& chain);
 
   std::uint64_t NumLeavesLeft() const noexcept { return m_source.NumLeaves() - m_leaves; }

@@ -89,6 +89,23 @@ std::optional<SoundRecord> SalvageSource::Read(OID oid, std::string* fault) cons
   }
 }
 
+std::optional<RawBody> SalvageSource::RemainsOfMap(OID oid, RawFamily family) const {
+  std::string ignored;
+  const std::optional<ByteView> bytes = ReadOrFault(m_state, oid, ignored);
+  if (!bytes) return std::nullopt;
+  for (OID other(1); !(m_largestId < other); other = OID(other.m_value + 1)) {
+    if (IsSealedFor(*bytes, other)) return std::nullopt;
+  }
+  try {
+    const RawEnvelope envelope = ReadRemainsOfRecord(*bytes);
+    const RawClass wanted{family, RawKind::kMap};
+    if (m_classes.Find(envelope.classNumber).value_or(wanted) != wanted) return std::nullopt;
+    return ReadRawBody(envelope.body, wanted);
+  } catch (const RawFault&) {
+    return std::nullopt;
+  }
+}
+
 std::optional<SoundRecord> SalvageSource::ReadAs(OID oid, const RawClass& rawClass, std::string* fault) const {
   std::optional<SoundRecord> record = Read(oid, fault);
   if (!record || record->rawClass == rawClass) return record;

@@ -46,6 +46,10 @@ class SalvageSource {
   // The same for a record of that class.
   std::optional<SoundRecord> ReadAs(OID oid, const RawClass& rawClass, std::string* fault = nullptr) const;
 
+  // What a damaged record of a map says, where it still reads as one: not to be trusted, but to be compared with what was found.
+  // A record that is sound under another id tells nothing. Costs a checksum for each id of the space.
+  std::optional<RawBody> RemainsOfMap(OID oid, RawFamily family) const;
+
   // A leaf that names a lost one as its neighbour, left or right, so that a walk along the chain can step over it; null if no
   // leaf does. What awaits deletion has such neighbours by right, and is left out.
   OID LeafAfter(OID lost) const { return Lookup(m_leafAfter, lost); }

@@ -48,6 +48,14 @@ class SalvageTest : public StoreTest {
     site.Tamper(oid, record);
   }
 
+  // What it says can still be read.
+  void DamageChecksum(OID oid) {
+    Bytes record = m_stored.records.at(oid);
+    record.back() ^= 1;
+    site.Tamper(oid, record);
+  }
+  static std::string NameOfLeaf(OID leaf) { return "salvaged/leaf " + std::to_string(leaf.m_value); }
+
   // The leaf with these keys, as the maps above are filled.
   static std::uint64_t FirstKeyOf(std::size_t leaf) { return 50 * leaf + 1; }
 
@@ -181,9 +189,9 @@ TEST_P(SalvageTest, FindsLeavesBetweenTwoBreaksThatNothingLeadsTo) {
   EXPECT_EQ(m_report.leftLeaves, 0u);
 }
 
-TEST_P(SalvageTest, PutsAMapTogetherWhoseOwnRecordIsLost) {
+TEST_P(SalvageTest, PutsAMapTogetherWhoseOwnRecordIsDamaged) {
   for (const bool withRoot : {false, true}) {
-    Damage(m_map);
+    DamageChecksum(m_map);
     if (withRoot) Damage(m_root);
     Rescue();
     EXPECT_EQ(Rescued<TombstonesMap>("t"), NumbersFrom(1, kKeys));
@@ -193,8 +201,65 @@ TEST_P(SalvageTest, PutsAMapTogetherWhoseOwnRecordIsLost) {
   }
 }
 
+TEST_P(SalvageTest, WhatIsLeftOfAMapsRecordGivesItsLeavesOrNone) {
+  const Bytes record = m_stored.records.at(m_map);
+  std::size_t found = 0;
+  for (std::size_t bit = 0; bit < 8 * record.size(); bit += 3) {
+    Bytes damaged = record;
+    damaged[bit / 8] ^= static_cast<std::uint8_t>(1u << bit % 8);
+    site.Tamper(m_map, damaged);
+    Rescue();
+    const Numbers numbers = Rescued<TombstonesMap>("t");
+    if (numbers.empty()) {
+      EXPECT_EQ(Rescued<TombstonesMap>(NameOfLeaf(m_leaves[0])), NumbersFrom(1, kKeys)) << "bit " << bit;
+      LossOf(m_leaves[0]);
+    } else {
+      EXPECT_EQ(numbers, NumbersFrom(1, kKeys)) << "bit " << bit;
+      ++found;
+    }
+  }
+  EXPECT_GT(found, record.size());
+}
+
+TEST_P(SalvageTest, PutsADamagedMapTogetherWhoseChainIsBroken) {
+  DamageChecksum(m_map);
+  for (const OID oid : {m_leaves[60], m_leaves[80]}) Damage(oid);
+  Rescue();
+  Numbers expected = NumbersFrom(1, kKeys);
+  for (const std::size_t i : {60u, 80u}) {
+    for (std::uint64_t n = FirstKeyOf(i); n < FirstKeyOf(i + 1); ++n) expected.erase(n);
+  }
+  EXPECT_EQ(Rescued<TombstonesMap>("t"), expected);
+}
+
+TEST_P(SalvageTest, AMapsRecordInThePlaceOfAnotherTellsNothing) {
+  CommitFilled<TombstonesMap>(space(), "u", 130);
+  const auto [map, leaf] = InSnapshot(space(), [](Snapshot& snapshot) {
+    const auto& u = snapshot.Root<TombstonesMap>("u");
+    return std::pair(u.GetPersistObjState().m_oid, u.m_firstLeaf.m_oid);
+  });
+  m_stored = Stored();
+  site.Tamper(map, m_stored.records.at(m_map));
+  site.Tamper(m_map, m_stored.records.at(map));
+  Rescue();
+  EXPECT_EQ(Rescued<TombstonesMap>("t"), Numbers());
+  EXPECT_EQ(Rescued<TombstonesMap>("u"), Numbers());
+  EXPECT_EQ(Rescued<TombstonesMap>(NameOfLeaf(m_leaves[0])), NumbersFrom(1, kKeys));
+  EXPECT_EQ(Rescued<TombstonesMap>(NameOfLeaf(leaf)), NumbersFrom(1, 130));
+}
+
+TEST_P(SalvageTest, TheLeavesOfAMapWhoseRecordIsGoneGetANameOfTheirOwn) {
+  site.Tamper(m_map, std::nullopt);
+  Rescue();
+  EXPECT_EQ(Rescued<TombstonesMap>("t"), Numbers());
+  EXPECT_EQ(Rescued<TombstonesMap>(NameOfLeaf(m_leaves[0])), NumbersFrom(1, kKeys));
+  ExpectTheRestIsThere();
+  LossOf(m_map);
+  LossOf(m_leaves[0]);
+}
+
 TEST_P(SalvageTest, PutsALostOwnedMapTogetherUnderItsId) {
-  Damage(m_owned);
+  DamageChecksum(m_owned);
   Rescue();
   WriteTransaction transaction(*m_rescued);
   EXPECT_EQ(NumbersOf(transaction.Owned<InsertionsMap>(m_owned)), NumbersFrom(1, 120));
@@ -211,16 +276,17 @@ TEST_P(SalvageTest, TakesTheNewerTreeWhereALostMapHadBeenReplaced) {
   Rescue();
   EXPECT_EQ(m_report.leftLeaves, m_leaves.size()) << "what was replaced is left behind";
   EXPECT_TRUE(m_report.losses.empty());
-  site.Tamper(m_map, std::nullopt);
+  m_stored = Stored();
+  DamageChecksum(m_map);
   Rescue();
   Numbers expected;
   for (std::uint64_t n = 1; n <= 300; ++n) expected[n] = n + 1'000;
   EXPECT_EQ(Rescued<TombstonesMap>("t"), expected);
-  EXPECT_EQ(Rescued<TombstonesMap>("salvaged/leaf " + std::to_string(m_leaves[0].m_value)), NumbersFrom(1, kKeys))
+  EXPECT_EQ(Rescued<TombstonesMap>(NameOfLeaf(m_leaves[0])), NumbersFrom(1, kKeys))
       << "the older tree is not thrown away: nothing tells for certain whose it was";
 }
 
-TEST_P(SalvageTest, TakesNoPartOfAnOlderTreeWhereALostMapHadBeenReplacedByOneOfOtherKeys) {
+TEST_P(SalvageTest, TakesNoPartOfAnOlderTreeWhereADamagedMapHadBeenReplacedByOneOfOtherKeys) {
   {
     WriteTransaction transaction(space());
     TombstonesMap fresh;
@@ -228,7 +294,8 @@ TEST_P(SalvageTest, TakesNoPartOfAnOlderTreeWhereALostMapHadBeenReplacedByOneOfO
     transaction.Root<TombstonesMap>("t") = fresh;
     transaction.Commit();
   }
-  site.Tamper(m_map, std::nullopt);
+  m_stored = Stored();
+  DamageChecksum(m_map);
   for (const bool isBroken : {false, true}) {
     if (isBroken) Damage(m_leaves[80]);
     Rescue();
@@ -242,12 +309,18 @@ TEST_P(SalvageTest, KeepsTheLeavesOfSeveralLostMapsApart) {
     const auto& u = snapshot.Root<TombstonesMap>("u");
     return std::pair(u.GetPersistObjState().m_oid, u.m_firstLeaf.m_oid);
   });
+  m_stored = Stored();
+  DamageChecksum(map);
+  DamageChecksum(m_map);
+  Rescue();
+  EXPECT_EQ(Rescued<TombstonesMap>("t"), NumbersFrom(1, kKeys));
+  EXPECT_EQ(Rescued<TombstonesMap>("u"), NumbersFrom(1, 130));
   site.Tamper(map, std::nullopt);
   site.Tamper(m_map, std::nullopt);
   Rescue();
   EXPECT_EQ(Rescued<TombstonesMap>("t"), Numbers());
-  EXPECT_EQ(Rescued<TombstonesMap>("salvaged/leaf " + std::to_string(m_leaves[0].m_value)), NumbersFrom(1, kKeys));
-  EXPECT_EQ(Rescued<TombstonesMap>("salvaged/leaf " + std::to_string(leaf.m_value)), NumbersFrom(1, 130));
+  EXPECT_EQ(Rescued<TombstonesMap>(NameOfLeaf(m_leaves[0])), NumbersFrom(1, kKeys));
+  EXPECT_EQ(Rescued<TombstonesMap>(NameOfLeaf(leaf)), NumbersFrom(1, 130));
   LossOf(map);
   LossOf(m_map);
 }
@@ -354,8 +427,8 @@ TEST_P(SalvageOfQueueTest, LeavesThatMayHaveBeenDeletedGetNoMapsName) {
   ASSERT_NE(head, m_leaves.end());
   const SalvageLoss* loss = LossOf(*head);
   ASSERT_NE(loss, nullptr);
-  EXPECT_NE(loss->what.find("whether they were deleted"), std::string::npos) << loss->what;
-  EXPECT_FALSE(Rescued<TombstonesMap>("salvaged/leaf " + std::to_string(head->m_value)).empty());
+  EXPECT_NE(loss->what.find("replaced or deleted"), std::string::npos) << loss->what;
+  EXPECT_FALSE(Rescued<TombstonesMap>(NameOfLeaf(*head)).empty());
 }
 
 TEST_P(SalvageOfQueueTest, LeavesThatMayHaveBeenDeletedFillNoHoleOfAnotherMap) {
@@ -382,7 +455,7 @@ TEST_P(SalvageOfQueueTest, LeavesThatMayHaveBeenDeletedFillNoHoleOfAnotherMap) {
   Rescue();
   for (std::uint64_t n = FirstKeyOf(4); n < FirstKeyOf(6); ++n) expected.erase(n);
   EXPECT_EQ(Rescued<TombstonesMap>("u"), expected);
-  EXPECT_EQ(Rescued<TombstonesMap>("salvaged/leaf " + std::to_string(leaves[4].m_value)),
+  EXPECT_EQ(Rescued<TombstonesMap>(NameOfLeaf(leaves[4])),
             NumbersFrom(FirstKeyOf(4), FirstKeyOf(6) - 1));
 }
 
