@@ -42,11 +42,12 @@ class NodeReader {
   DecodedObject Read(const prefbase& reference, const IPersistable::FnTable* expected) const {
     const std::optional<ByteView> record = m_view.State().Read(reference.m_oid);
     if (!record) {
+      const std::string_view className = FindClass(expected)->Name();
       throw DanglingReference(
-          m_view.Describe(reference.m_oid, "", "it is referred to, but there is no record of it (run vemo verify)"),
-          m_view.Place(reference.m_oid));
+          m_view.Describe(reference.m_oid, className, "it is referred to, but there is no record of it (run vemo verify)"),
+          m_view.Place(reference.m_oid, className));
     }
-    DecodedObject object(m_view.Decode(reference.m_oid, *record));
+    DecodedObject object(m_view.Decode(reference.m_oid, *record, expected));
     if (object.Get().Table() != expected) m_view.RefuseClass(reference.m_oid, object.Get().Table(), expected);
     return object;
   }

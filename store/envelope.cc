@@ -75,6 +75,13 @@ std::uint64_t CommitOfRecord(ByteView bytes) noexcept {
   return bytes.size() < commitAt + kCommitBytes ? 0 : ReadUint64At(bytes.data() + commitAt);
 }
 
+std::uint32_t ClassNumberOfRecord(ByteView bytes) noexcept {
+  if (bytes.size() < 2 || bytes.size() < 1 + VariableLengthBytes(bytes[1])) return 0;
+  std::uint64_t number = 0;
+  DeserialiseVariableLengthUint64(&bytes[1], number);
+  return number > UINT32_MAX ? 0 : static_cast<std::uint32_t>(number);
+}
+
 Bytes SealNamed(NamedTable table, std::string_view name, ByteView value) {
   Bytes out;
   out.reserve(1 + value.size() + kChecksumBytes);

@@ -35,6 +35,9 @@ RecordEnvelope OpenRecord(ByteView bytes, OID oid);
 // The commit that wrote a record, read without checking anything; 0 for bytes that are too short.
 std::uint64_t CommitOfRecord(ByteView bytes) noexcept;
 
+// The class number in a record's head, read without checking anything; 0 where there is none.
+std::uint32_t ClassNumberOfRecord(ByteView bytes) noexcept;
+
 Bytes SealNamed(NamedTable table, std::string_view name, ByteView value);
 ByteView OpenNamed(NamedTable table, std::string_view name, ByteView bytes);
 

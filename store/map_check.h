@@ -13,9 +13,9 @@
 #include <utility>
 #include <vector>
 
-#include "platform/error.h"
 #include "platform/field_id.h"
 #include "platform/types.h"
+#include "store/error.h"
 #include "store/id_set.h"
 #include "vxPersistStore/pref.h"
 
@@ -25,6 +25,9 @@ struct MapFinding {
   OID oid;            // the node at fault; null where the fault is the map's own
   std::string where;  // the way from the root by child numbers, such as "root.-1.7"
   std::string fault;
+  // Of a node that cannot be read: the class that the exception names, if it does, and the table of the one that should stand there.
+  std::string className = {};
+  const IPersistable::FnTable* expected = nullptr;
 };
 
 // Reads nodes by following references, so that they are loaded and stay as the map's own operations leave them.
@@ -34,7 +37,7 @@ class BoundNodeReader {
     ptr<IPersistable> Get() const noexcept { return object; }
     ptr<IPersistable> object;
   };
-  // The node behind a reference that is not empty; throws an Error where there is none.
+  // The node behind a reference that is not empty; throws a StoreError where there is none.
   Node Read(const prefbase& reference, const IPersistable::FnTable* expected) const { return {reference.GetAs(expected)}; }
 };
 
@@ -42,8 +45,8 @@ class BoundNodeReader {
 template <class Map, class Reader = BoundNodeReader>
 class MapCheck {
  public:
-  // `onNode` is called with the id of each node that is reached.
-  explicit MapCheck(const Map& map, Reader reader = {}, std::function<void(OID)> onNode = {})
+  // `onNode` is called with the id of each node that is reached, and the way to it.
+  explicit MapCheck(const Map& map, Reader reader = {}, std::function<void(OID, const std::string& where)> onNode = {})
       : m_map(map), m_reader(std::move(reader)), m_onNode(std::move(onNode)) {}
 
   // Reads every node. Linear in the size of the map.
@@ -101,15 +104,15 @@ class MapCheck {
       Find(reference.m_oid, where, "the node hangs in the tree twice");
       return {};
     }
-    if (m_onNode) m_onNode(reference.m_oid);
+    if (m_onNode) m_onNode(reference.m_oid, where);
     const auto* expected =
         height > 0 ? IPersistable::Stubs<InternalNode>::GetTable() : IPersistable::Stubs<LeafNode>::GetTable();
     try {
       Holder node = m_reader.Read(reference, expected);
       if (node.Get().Table() == expected) return node;
       Find(reference.m_oid, where, "a node of the wrong class at height " + std::to_string(height));
-    } catch (const Error& error) {
-      Find(reference.m_oid, where, error.what());
+    } catch (const StoreError& error) {
+      m_findings.push_back({reference.m_oid, where, error.what(), error.place().className, expected});
     }
     m_incomplete = true;
     return {};
@@ -182,7 +185,7 @@ class MapCheck {
 
   const Map& m_map;
   const Reader m_reader;
-  const std::function<void(OID)> m_onNode;
+  const std::function<void(OID, const std::string&)> m_onNode;
   std::vector<MapFinding> m_findings;
   std::vector<MapFinding> m_chainFindings;
   IdSet m_visited;

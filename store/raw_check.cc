@@ -28,6 +28,10 @@ class Checker {
       : m_state(state), m_progress(progress), m_classes(state) {}
 
   RawCheckReport Run() {
+    for (const StorageFinding& finding : m_state.CheckStorage()) {
+      const std::string page = finding.page ? "page " + std::to_string(*finding.page) + ": " : "";
+      Find("", "", OID(), "", page + finding.what);
+    }
     CheckInfo();
     CheckMeta();
     for (const auto& [name, bytes] : RootValues()) CheckRoot(name, bytes);
@@ -235,9 +239,14 @@ class Checker {
       className = RawClassName(*rawClass);
       return Opened{*rawClass, ReadRawBody(envelope.body, *rawClass)};
     } catch (const RawFault& fault) {
-      Find(root, path, oid, std::move(className), fault.what());
+      Find(root, path, oid, className.empty() ? ClassInHead(record) : std::move(className), fault.what());
       return std::nullopt;
     }
+  }
+
+  std::string ClassInHead(ByteView record) const {
+    const std::optional<RawClass> rawClass = m_classes.Find(RawClassNumber(record));
+    return rawClass ? RawClassName(*rawClass) : "";
   }
 
   // What hangs below the queue may be missing already.
@@ -255,7 +264,7 @@ class Checker {
       const std::optional<ByteView> record = ReadOrFault(m_state, oid, fault);
       if (!record || !m_awaitingDeletion.Insert(oid)) continue;
       if (m_reached.Contains(oid)) {
-        Find("", "", oid, "", "it awaits deletion, and a root map reaches it");
+        Find("", "", oid, ClassInHead(*record), "it awaits deletion, and a root map reaches it");
         continue;
       }
       const std::optional<Opened> opened = OpenBytes("", "", oid, *record);

@@ -18,7 +18,9 @@ struct RawFinding {
   std::string root;       // as its name is stored; empty where the fault is the space's own
   std::string path;       // from the root's node down by child numbers, such as "root.-1.7"; "map" for the map's own record
   OID oid;                // the object at fault, or null
-  std::string className;  // what it is, or should be; empty where that is not known
+  // What it is, or should be where it cannot be read; of what nothing refers to, what its damaged head says. Empty where nothing
+  // tells it.
+  std::string className;
   std::string fault;
 };
 
@@ -34,7 +36,7 @@ struct RawCheckReport {
   std::uint64_t unreachable = 0;  // neither reached from a root nor awaiting deletion
 };
 
-// Checks every envelope, every body, order, fill and bounds of keys, the chain of leaves both ways, sizes, heights, classes, that no
+// Checks what the engine keeps the commit in, every envelope, every body, order, fill and bounds of keys, the chain of leaves both ways, sizes, heights, classes, that no
 // node has two owners, that references lead to something, named values and the queue of deletions. Collects every fault, those of
 // the engine too, behind which it goes on where it can. `progress` is told how many records were read.
 //

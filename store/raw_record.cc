@@ -214,6 +214,16 @@ RawEnvelope ReadRemainsOfRecord(ByteView bytes) {
 
 bool IsSealedFor(ByteView bytes, OID oid) { return HasChecksum(bytes, oid.m_value); }
 
+std::uint32_t RawClassNumber(ByteView bytes) {
+  try {
+    Cursor cursor(bytes);
+    cursor.Skip(1);
+    return cursor.Number32();
+  } catch (const RawFault&) {
+    return 0;
+  }
+}
+
 ByteView OpenRawNamed(NamedTable table, std::string_view name, ByteView bytes) {
   return Unseal(bytes, XXH3_64bits_withSeed(name.data(), name.size(), static_cast<std::uint64_t>(table)));
 }

@@ -73,6 +73,8 @@ RawEnvelope OpenRawRecord(ByteView bytes, OID oid);
 RawEnvelope ReadRemainsOfRecord(ByteView bytes);
 // Whether the checksum is that of a record of `oid`.
 bool IsSealedFor(ByteView bytes, OID oid);
+// The class number in the head of a record that may be damaged, read without checking anything; 0 where there is none.
+std::uint32_t RawClassNumber(ByteView bytes);
 ByteView OpenRawNamed(NamedTable table, std::string_view name, ByteView bytes);
 
 // Throws RawFault unless the body is of that class, from the first byte to the last.

@@ -145,11 +145,10 @@ ptr<IPersistable> Reach::Decode(const std::string& root, OID oid, const IPersist
   }
   ptr<IPersistable> object;
   try {
-    object = m_snapshot.Objects().Decode(oid, *record);
+    object = m_snapshot.Objects().Decode(oid, *record, expected);
   } catch (const CorruptRecord& corrupt) {
     ErrorPlace place = corrupt.place();
     place.root = root;
-    if (place.className.empty()) place.className = className;
     throw CorruptRecord(std::string(corrupt.what()) + " (" + RootText(root) + ", where a " + std::string(className) +
                             " should stand)" + std::string(kAdvice),
                         std::move(place));

@@ -6,6 +6,7 @@
 #include "store/envelope.h"
 #include "store/id_set.h"
 #include "store/map_check.h"
+#include "store/raw_check.h"
 #include "vxOperation/src/WorkingSet/CompOp/VectorOT.h"
 
 namespace vemo {
@@ -19,17 +20,42 @@ class SpaceCheck {
 
   VerifyReport Run() {
     for (const StorageFinding& finding : State().CheckStorage()) {
-      Find("", OID(), (finding.page ? "page " + std::to_string(*finding.page) + ": " : "") + finding.what);
+      FindInSpace((finding.page ? "page " + std::to_string(*finding.page) + ": " : "") + finding.what);
     }
     CheckNamedValues();
     for (const std::string& name : RootNames()) CheckRoot(name);
     CheckRecords();
+    m_report.space = Objects().Place(OID()).space;
     return std::move(m_report);
   }
 
  private:
-  void Find(const std::string& root, OID oid, const std::string& fault) { m_report.findings.push_back({root, oid, fault}); }
-  const EngineSnapshot& State() { return m_snapshot.Objects().State(); }
+  void Find(std::string root, std::string path, OID oid, std::string className, std::string fault) {
+    if (className.empty() && !oid.IsNull()) className = ClassInHead(oid);
+    m_report.findings.push_back({std::move(root), std::move(path), oid, std::move(className), std::move(fault)});
+  }
+  void FindInSpace(std::string fault) { Find("", "", OID(), "", std::move(fault)); }
+
+  std::string ClassInHead(OID oid) {
+    try {
+      const std::optional<ByteView> record = State().Read(oid);
+      return record ? std::string(Objects().ClassInHead(*record)) : "";
+    } catch (const StoreError&) {
+      return "";
+    }
+  }
+
+  // What an exception about an object says, without what a finding says beside it.
+  std::string ReasonIn(std::string what, OID oid, const std::string& className) {
+    const std::string prefix = Objects().Describe(oid, className, "");
+    constexpr std::string_view kAdvice = " (run vemo verify)";
+    if (what.starts_with(prefix)) what.erase(0, prefix.size());
+    if (what.ends_with(kAdvice)) what.erase(what.size() - kAdvice.size());
+    return what;
+  }
+
+  View& Objects() { return m_snapshot.Objects(); }
+  const EngineSnapshot& State() { return Objects().State(); }
 
   // Runs a step that the engine may have to leave where it meets damage; what is behind it goes unchecked.
   template <typename Step>
@@ -37,7 +63,7 @@ class SpaceCheck {
     try {
       step();
     } catch (const DamagedStorage& damaged) {
-      Find("", OID(), damaged.what());
+      FindInSpace(damaged.what());
     }
   }
 
@@ -80,7 +106,7 @@ class SpaceCheck {
       try {
         OpenNamed(table, name, sealed);
       } catch (const MalformedBytes& malformed) {
-        Find("", OID(), "named value \"" + std::string(name) + "\": " + malformed.what());
+        FindInSpace("named value \"" + std::string(name) + "\": " + malformed.what());
       }
       return true;
     });
@@ -95,9 +121,23 @@ class SpaceCheck {
       CheckMapOfClass<FieldIdToVectorTombstonesMap>(name, map);
       CheckMapOfClass<FieldIdToVectorInsertionsAndDeletionsMap>(name, map);
     } catch (const CorruptRecord& corrupt) {
-      Find(name, corrupt.oid(), corrupt.what());
+      const std::string& className = corrupt.place().className;
+      const RootValue value = ValueOfRoot(name);
+      if (!value.oid.IsNull()) m_reached.Insert(value.oid);
+      Find(name, corrupt.oid().IsNull() ? "" : "map", corrupt.oid(), className.empty() ? value.className : className,
+           ReasonIn(corrupt.what(), corrupt.oid(), className));
     } catch (const IncompatibleSpace& unknown) {
-      Find(name, OID(), unknown.what());
+      Find(name, "", OID(), ValueOfRoot(name).className, unknown.what());
+    }
+  }
+
+  // Empty where it cannot be read.
+  RootValue ValueOfRoot(const std::string& name) {
+    try {
+      const std::optional<ByteView> sealed = State().ReadNamed(NamedTable::kRoots, name);
+      return sealed ? DecodeRootValue(name, *sealed) : RootValue();
+    } catch (const Error&) {
+      return {};
     }
   }
 
@@ -105,11 +145,16 @@ class SpaceCheck {
   void CheckMapOfClass(const std::string& name, ptr<IPersistable> object) {
     if (object.Table() != IPersistable::Stubs<Map>::GetTable()) return;
     const auto& map = *static_cast<const Map*>(object.m_self);
-    const auto reach = [&](OID oid) {
-      if (!m_reached.Insert(oid)) Find(name, oid, "the node belongs to two maps");
+    const auto reach = [&](OID oid, const std::string& where) {
+      if (!m_reached.Insert(oid)) Find(name, where, oid, "", "the node belongs to two maps");
     };
     MapCheck<Map, NodeReader> check(map, NodeReader(m_snapshot), reach);
-    for (const MapFinding& finding : check.Run()) Find(name, finding.oid, finding.where + ": " + finding.fault);
+    for (const MapFinding& finding : check.Run()) {
+      const OID oid = finding.oid.IsNull() ? PersistStateOf(object).m_oid : finding.oid;
+      std::string className = finding.className;
+      if (className.empty() && finding.expected != nullptr) className = FindClass(finding.expected)->Name();
+      Find(name, finding.where, oid, className, ReasonIn(finding.fault, oid, finding.className));
+    }
     m_report.entries += static_cast<std::uint64_t>(map.m_size);
     m_report.nodes += check.NumVisited();
   }
@@ -140,7 +185,7 @@ class SpaceCheck {
       const std::optional<ByteView> record = State().Read(oid);
       if (!record || !ids.Insert(oid)) continue;
       if (m_reached.Contains(oid)) {
-        Find("", oid, "it awaits deletion, and a root map reaches it");
+        Find("", "", oid, "", "it awaits deletion, and a root map reaches it");
         continue;
       }
       const DecodedObject object = CheckForm(oid, *record);
@@ -155,7 +200,8 @@ class SpaceCheck {
     try {
       return DecodedObject(m_snapshot.Objects().Decode(oid, record));
     } catch (const CorruptRecord& corrupt) {
-      if (m_faulty.Insert(oid)) Find("", oid, corrupt.what());
+      const std::string& className = corrupt.place().className;
+      if (m_faulty.Insert(oid)) Find("", "", oid, className, ReasonIn(corrupt.what(), oid, className));
       return {};
     }
   }
@@ -171,6 +217,10 @@ class SpaceCheck {
 
 VerifyReport VerifySpace(Snapshot& snapshot, const std::function<void(std::uint64_t, std::uint64_t)>& progress) {
   return SpaceCheck(snapshot, progress).Run();
+}
+
+std::string FindingText(const Finding& finding) {
+  return RawFindingText({finding.root, finding.path, finding.oid, finding.className, finding.fault});
 }
 
 }  // namespace vemo

@@ -11,12 +11,20 @@
 namespace vemo {
 
 struct Finding {
-  std::string root;  // the root map below which the fault lies; empty where it is the space's own
+  std::string root;  // as its name is stored; empty where the fault is the space's own
+  std::string path;  // from the root's node down by child numbers, such as "root.-1.7"; "map" for the map's own record
   OID oid;           // the object at fault, or null
+  // What it is, or should be where it cannot be read; of what nothing refers to, what its damaged head says. Empty where nothing
+  // tells it.
+  std::string className;
   std::string fault;
 };
 
+// One line for people.
+std::string FindingText(const Finding& finding);
+
 struct VerifyReport {
+  std::string space;  // its name, such as "lmdb:/path"
   std::vector<Finding> findings;
   std::uint64_t maps = 0;
   std::uint64_t entries = 0;

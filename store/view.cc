@@ -54,6 +54,14 @@ std::size_t ParseClassNumber(std::string_view text) {
   return number;
 }
 
+// Empty for a table that is null or of no class of the maps.
+std::string_view NameOf(const IPersistable::FnTable* table) {
+  const ClassEntry* found = table == nullptr ? nullptr : FindClass(table);
+  return found == nullptr ? std::string_view() : found->Name();
+}
+
+}  // namespace
+
 RootValue DecodeRootValue(std::string_view name, ByteView sealed) {
   const ByteView value = OpenNamed(NamedTable::kRoots, name, sealed);
   BoundedReader reader(value);
@@ -62,8 +70,6 @@ RootValue DecodeRootValue(std::string_view name, ByteView sealed) {
   root.className.assign(value.begin() + static_cast<std::ptrdiff_t>(reader.offset()), value.end());
   return root;
 }
-
-}  // namespace
 
 View* ReadingView() noexcept { return t_readingView; }
 
@@ -223,10 +229,12 @@ ptr<IPersistable> View::Resolve(OID oid, const IPersistable::FnTable* expected) 
   if (object.m_self == nullptr) {
     const std::optional<ByteView> record = State().Read(oid);
     if (!record) {
-      throw DanglingReference(Describe(oid, "", "it is referred to, but there is no record of it (run vemo verify)"),
-                              Place(oid));
+      const std::string_view className = NameOf(expected);
+      throw DanglingReference(
+          Describe(oid, className, "it is referred to, but there is no record of it (run vemo verify)"),
+          Place(oid, className));
     }
-    object = Decode(oid, *record);
+    object = Decode(oid, *record, expected);
     try {
       Adopt(oid, object, CommitOfRecord(*record));
     } catch (...) {
@@ -240,20 +248,20 @@ ptr<IPersistable> View::Resolve(OID oid, const IPersistable::FnTable* expected) 
 }
 
 void View::RefuseClass(OID oid, const IPersistable::FnTable* found, const IPersistable::FnTable* expected) const {
-  const ClassEntry* wanted = FindClass(expected);
-  const std::string_view className = FindClass(found)->Name();
+  const std::string_view wanted = NameOf(expected);
+  const std::string_view className = NameOf(found);
   throw CorruptRecord(Describe(oid, className,
-                               "a " + std::string(wanted != nullptr ? wanted->Name() : "different class") +
+                               "a " + std::string(!wanted.empty() ? wanted : "different class") +
                                    " should stand here (run vemo verify)"),
                       Place(oid, className));
 }
 
-ptr<IPersistable> View::Decode(OID oid, ByteView record) {
-  std::string_view className;
+ptr<IPersistable> View::Decode(OID oid, ByteView record, const IPersistable::FnTable* expected) {
+  std::string_view className;  // while it is empty, the record has not told it
   ptr<IPersistable> object;
   try {
     const RecordEnvelope envelope = OpenRecord(record, oid);
-    const ClassEntry& classEntry = ClassOf(oid, envelope.classNumber);
+    const ClassEntry& classEntry = ClassOf(oid, envelope.classNumber, expected);
     className = classEntry.Name();
     BoundedReader reader(envelope.body);
     classEntry.checkForm(reader);
@@ -265,6 +273,7 @@ ptr<IPersistable> View::Decode(OID oid, ByteView record) {
     return object;
   } catch (const MalformedBytes& malformed) {
     if (object.m_self != nullptr) DestroyObject(object);
+    if (className.empty()) className = NameOf(expected);
     ErrorPlace place = Place(oid, className);
     place.offset = malformed.offset();
     throw CorruptRecord(Describe(oid, className, malformed.what()), std::move(place));
@@ -293,12 +302,20 @@ void View::ReadClassNumbers() {
   m_classes = std::move(classes);
 }
 
-const ClassEntry& View::ClassOf(OID oid, std::uint32_t number) const {
-  if (number == 0 || number > m_classes.size() || m_classes[number - 1] == nullptr) {
-    throw CorruptRecord(Describe(oid, "", "its class number " + std::to_string(number) + " names no class known here"),
-                        Place(oid));
-  }
-  return *m_classes[number - 1];
+const ClassEntry* View::FindClassNumber(std::uint32_t number) const noexcept {
+  return number == 0 || number > m_classes.size() ? nullptr : m_classes[number - 1];
+}
+
+const ClassEntry& View::ClassOf(OID oid, std::uint32_t number, const IPersistable::FnTable* expected) const {
+  if (const ClassEntry* found = FindClassNumber(number)) return *found;
+  throw CorruptRecord(
+      Describe(oid, NameOf(expected), "its class number " + std::to_string(number) + " names no class known here"),
+      Place(oid, NameOf(expected)));
+}
+
+std::string_view View::ClassInHead(ByteView record) const noexcept {
+  const ClassEntry* found = FindClassNumber(ClassNumberOfRecord(record));
+  return found == nullptr ? std::string_view() : found->Name();
 }
 
 std::uint32_t View::ClassNumber(const ClassEntry& classEntry) const noexcept {
@@ -390,7 +407,7 @@ void View::ReadRoot(std::string_view name, Root& root) {
                                      "root \"" + std::string(name) + "\" has no record (run vemo verify)"),
                             Place(root.oid, root.classEntry->Name(), name));
   }
-  const ptr<IPersistable> read = Decode(root.oid, *record);
+  const ptr<IPersistable> read = Decode(root.oid, *record, root.classEntry->table);
   const bool isOfClass = read.Table() == root.map.Table();
   if (isOfClass) {
     // Decode checked the record; reading it once more, into the map at its fixed address, cannot fail.

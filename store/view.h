@@ -53,6 +53,8 @@ struct RootValue {
   OID oid;
 };
 Bytes EncodeRootValue(std::string_view name, const RootValue& value);
+// Throws MalformedBytes.
+RootValue DecodeRootValue(std::string_view name, ByteView sealed);
 
 class View {
  public:
@@ -96,8 +98,13 @@ class View {
   // Throws CorruptRecord: the object's table is `found`, which is not `expected`.
   [[noreturn]] void RefuseClass(OID oid, const IPersistable::FnTable* found, const IPersistable::FnTable* expected) const;
 
-  // Checks a record and reads it into a fresh object that belongs to nobody yet; its references carry this view.
-  ptr<IPersistable> Decode(OID oid, ByteView record);
+  // Checks a record and reads it into a fresh object that belongs to nobody yet; its references carry this view. Throws
+  // CorruptRecord, which names the class of the record or, where the record cannot tell it, `expected`'s. An object of another class
+  // than `expected` is returned all the same.
+  ptr<IPersistable> Decode(OID oid, ByteView record, const IPersistable::FnTable* expected = nullptr);
+
+  // The class that a record's head names, read without checking anything; empty where it names none.
+  std::string_view ClassInHead(ByteView record) const noexcept;
 
   // The resident `oid`, or null.
   ptr<IPersistable> Find(OID oid) const noexcept;
@@ -151,7 +158,8 @@ class View {
   ErrorPlace Place(OID oid, std::string_view className = "", std::string_view root = "") const;
 
  private:
-  const ClassEntry& ClassOf(OID oid, std::uint32_t number) const;
+  const ClassEntry* FindClassNumber(std::uint32_t number) const noexcept;
+  const ClassEntry& ClassOf(OID oid, std::uint32_t number, const IPersistable::FnTable* expected) const;
   void ReadClassNumbers();
   void ReadRoot(std::string_view name, Root& root);
   void Own(ptr<IPersistable> object, OID oid) noexcept;

@@ -17,10 +17,7 @@ namespace vemo::tool {
 
 namespace {
 
-void PrintFinding(const Finding& finding) {
-  fmt::print("{}{}{}\n", finding.root.empty() ? "" : "root \"" + OneLine(finding.root) + "\", ",
-             finding.oid.IsNull() ? "" : fmt::format("object {}: ", finding.oid.m_value), OneLine(finding.fault));
-}
+void PrintFinding(const std::string& space, const std::string& finding) { fmt::print("{}: {}\n", space, OneLine(finding)); }
 
 struct VerifyArguments {
   std::string store;
@@ -36,7 +33,7 @@ ExitCode RunVerify(const VerifyArguments& arguments) {
     ProgressBar bar("verifying", space->Usage().records);
     report = VerifySpace(snapshot, [&bar](std::uint64_t done, std::uint64_t) { bar.Update(done); });
   }
-  for (const Finding& finding : report.findings) PrintFinding(finding);
+  for (const Finding& finding : report.findings) PrintFinding(report.space, FindingText(finding));
   std::size_t findings = report.findings.size();
   // What the maps say to one another can be compared only where each is sound.
   if (findings == 0 && HasHistory(snapshot)) {
@@ -59,7 +56,7 @@ ExitCode RunRawVerify(const std::string& store) {
     ProgressBar bar("verifying", engine->Usage().records);
     report = CheckRawSpace(*state, [&bar](std::uint64_t done) { bar.Update(done); });
   }
-  for (const RawFinding& finding : report.findings) fmt::print("{}\n", OneLine(RawFindingText(finding)));
+  for (const RawFinding& finding : report.findings) PrintFinding(engine->Name(), RawFindingText(finding));
   fmt::print("{} maps, {} entries, {} nodes, {} records, {} unreachable: {}\n", Grouped(report.maps),
              Grouped(report.entries), Grouped(report.nodes), Grouped(report.records), Grouped(report.unreachable),
              report.findings.empty() ? "sound" : fmt::format("{} findings", report.findings.size()));

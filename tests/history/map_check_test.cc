@@ -75,7 +75,7 @@ TEST(MapCheckOfAnySizeTest, FindsNothingInSoundTrees) {
 
 TEST_F(MapCheckTest, VisitsEveryNode) {
   std::set<OID> reached;
-  MapCheck<Map> check(m_tree.map(), {}, [&reached](OID oid) { reached.insert(oid); });
+  MapCheck<Map> check(m_tree.map(), {}, [&reached](OID oid, const std::string&) { reached.insert(oid); });
   check.Run();
   EXPECT_EQ(check.NumVisited(), 4u);
   EXPECT_EQ(reached.size(), 4u);

@@ -47,14 +47,15 @@ class VerifySpaceTest : public ::testing::Test {
     Snapshot snapshot(*m_space);
     return VerifySpace(snapshot);
   }
-  // Each finding as "ROOT OBJECT fault", and only the first words of what an exception said.
+  // Each finding as "ROOT OBJECT PATH: fault".
   static Strings Texts(const VerifyReport& report) {
     Strings texts;
     for (const Finding& finding : report.findings)
-      texts.push_back(finding.root + " " + std::to_string(finding.oid.m_value) + " " + finding.fault);
+      texts.push_back(finding.root + " " + std::to_string(finding.oid.m_value) + " " + finding.path + ": " + finding.fault);
     return texts;
   }
 
+  OID MapT() { return Snapshot(*m_space).Root<Tombstones>("t").GetPersistObjState().m_oid; }
   OID LeafOfT(int i) {
     Snapshot snapshot(*m_space);
     const auto* leaf = snapshot.Root<Tombstones>("t").m_firstLeaf.Get();
@@ -82,7 +83,7 @@ TEST_F(VerifySpaceTest, FindsStructuralDamageAndNamesItsRoot) {
     ++map.m_size;
     map.MarkAsDirtyWithoutTrace();
   });
-  EXPECT_EQ(Texts(Verify()), Strings{"t 0 map: the size is 161, but there are 160 entries"});
+  EXPECT_EQ(Texts(Verify()), Strings{"t " + std::to_string(MapT().m_value) + " map: the size is 161, but there are 160 entries"});
 }
 
 TEST_F(VerifySpaceTest, NamesTheNodeOfAFault) {

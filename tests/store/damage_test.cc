@@ -1,5 +1,8 @@
 // Stored bytes that are not what was written.
+#include <tuple>
+
 #include "store/envelope.h"
+#include "store/raw_check.h"
 #include "store/verify.h"
 #include "tests/store/store_fixture.h"
 
@@ -219,6 +222,67 @@ TEST_P(DamageTest, VerifyNamesEveryFaultAndGoesOn) {
   for (const OID oid : ids) EXPECT_TRUE(found.contains(oid)) << oid.m_value;
   EXPECT_EQ(report.records, m_stored.records.size());
   EXPECT_GE(report.entries, 20u);
+}
+
+// Damage behind which nothing of the record can be read, its class neither.
+TEST_P(DamageTest, VerifyNamesPlaceAndClassOfWhatCannotBeRead) {
+  const std::string map = "vemo::FieldIdToVectorTombstonesMap";
+  const std::vector<std::tuple<OID, std::string, std::string>> objects{
+      {MapOf("t"), "map", map}, {RootNodeOf("t"), "root", map + "InternalNode"}, {FirstLeafOf("t"), "root.-1", map + "LeafNode"}};
+  for (const auto& [oid, path, className] : objects) {
+    const Bytes record = m_stored.records.at(oid);
+    for (const std::optional<Bytes>& damaged :
+         {std::optional<Bytes>(), std::optional(Bytes()), std::optional(Bytes(record.size())), std::optional(Bytes(record.size(), 0xff))}) {
+      site.Tamper(oid, damaged);
+      Snapshot snapshot(space());
+      const VerifyReport report = VerifySpace(snapshot);
+      EXPECT_EQ(report.space, site.engine().Name());
+      ASSERT_EQ(report.findings.size(), 1u);
+      const Finding& finding = report.findings.front();
+      const RawFinding raw = CheckRawSpace(*site.engine().OpenSnapshot()).findings.front();
+      EXPECT_EQ(finding.root, "t");
+      EXPECT_EQ(finding.path, path);
+      EXPECT_EQ(finding.oid, oid);
+      EXPECT_EQ(finding.className, className);
+      EXPECT_EQ(std::tie(raw.root, raw.path, raw.oid, raw.className),
+                std::tie(finding.root, finding.path, finding.oid, finding.className));
+      EXPECT_EQ(FindingText(finding), "root \"t\", " + path + ", object " + std::to_string(oid.m_value) + " (" + className +
+                                          "): " + finding.fault);
+      EXPECT_EQ(finding.fault.find("object"), std::string::npos) << "said twice: " << finding.fault;
+    }
+    site.Tamper(oid, record);
+  }
+}
+
+TEST_P(DamageTest, VerifyNamesTheClassThatTheHeadOfADamagedRecordTells) {
+  const OID leaf = FirstLeafOf("t");
+  site.TamperNamed(NamedTable::kRoots, "t", std::nullopt);
+  for (const bool hasHead : {true, false}) {
+    Bytes damaged = m_stored.records.at(leaf);
+    damaged.back() ^= 1;
+    if (!hasHead) damaged[1] = 0x7f;
+    site.Tamper(leaf, damaged);
+    Snapshot snapshot(space());
+    const VerifyReport report = VerifySpace(snapshot);
+    const RawCheckReport raw = CheckRawSpace(*site.engine().OpenSnapshot());
+    ASSERT_EQ(report.findings.size(), 1u);
+    ASSERT_EQ(raw.findings.size(), 1u);
+    EXPECT_EQ(report.findings.front().oid, leaf);
+    EXPECT_EQ(report.findings.front().className, hasHead ? "vemo::FieldIdToVectorTombstonesMapLeafNode" : "");
+    EXPECT_EQ(raw.findings.front().className, report.findings.front().className);
+  }
+}
+
+TEST_P(DamageTest, ExceptionsNameTheClassThatWasAskedFor) {
+  const OID leaf = FirstLeafOf("t");
+  site.Tamper(leaf, Bytes(20));
+  Snapshot snapshot(space());
+  try {
+    ToText(snapshot.Root<TombstonesMap>("t"));
+    ADD_FAILURE() << "it was read";
+  } catch (const CorruptRecord& corrupt) {
+    EXPECT_EQ(corrupt.place().className, "vemo::FieldIdToVectorTombstonesMapLeafNode");
+  }
 }
 
 TEST_P(DamageTest, VerifyFindsNothingInASoundSpace) {

@@ -35,7 +35,12 @@ class RawCheckTest : public StoreTest {
       texts.push_back(text);
     }
     Snapshot snapshot(space());
-    EXPECT_EQ(VerifySpace(snapshot).findings.empty(), texts.empty()) << "the two checks disagree";
+    const VerifyReport report = VerifySpace(snapshot);
+    EXPECT_EQ(report.findings.empty(), texts.empty()) << "the two checks disagree";
+    EXPECT_EQ(report.space, site.engine().Name());
+    for (const Finding& finding : report.findings) {
+      EXPECT_TRUE(finding.oid.IsNull() || !finding.className.empty()) << FindingText(finding);
+    }
     return texts;
   }
 

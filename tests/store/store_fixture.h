@@ -168,7 +168,7 @@ std::string MessageOf(Act&& act) {
 template <class Map>
 std::unordered_set<OID> NodeIds(const Map& map) {
   std::unordered_set<OID> ids;
-  MapCheck<Map>(map, {}, [&ids](OID oid) { ids.insert(oid); }).Run();
+  MapCheck<Map>(map, {}, [&ids](OID oid, const std::string&) { ids.insert(oid); }).Run();
   return ids;
 }
 

@@ -1,4 +1,6 @@
 #include "engines/lmdb/lmdb_engine.h"
+#include "engines/lmdb/seal_file.h"
+#include "engines/lmdb/space_folder.h"
 #include "history/replay.h"
 #include "history/site.h"
 #include "store/snapshot.h"
@@ -68,17 +70,20 @@ TEST_F(VerifyCommandTest, OfASpaceInMemoryFindsAnEmptyOne) {
 }
 
 TEST_F(VerifyCommandTest, FindsATreeThatIsWrong) {
-  Damage([](WriteTransaction& transaction) {
-    auto& map = transaction.Root<FieldIdToVectorTombstonesMap>(kTombstonesRoot);
-    ++map.m_size;
-    map.MarkAsDirtyWithoutTrace();
+  OID map;
+  Damage([&map](WriteTransaction& transaction) {
+    auto& tombstones = transaction.Root<FieldIdToVectorTombstonesMap>(kTombstonesRoot);
+    map = tombstones.GetPersistObjState().m_oid;
+    ++tombstones.m_size;
+    tombstones.MarkAsDirtyWithoutTrace();
   });
   const Outcome outcome = Vemo({"verify", uri()});
   EXPECT_EQ(outcome.exitCode, 1);
   EXPECT_EQ(outcome.err, "");
   EXPECT_EQ(outcome.out,
-            "root \"tombstones\", map: the size is 2, but there are 1 entries\n"
-            "3 maps, 4 entries, 3 nodes, 6 records, 0 unreachable: 1 findings\n");
+            uri() + ": root \"tombstones\", map, object " + std::to_string(map.m_value) +
+                " (vemo::FieldIdToVectorTombstonesMap): the size is 2, but there are 1 entries\n"
+                "3 maps, 4 entries, 3 nodes, 6 records, 0 unreachable: 1 findings\n");
 }
 
 TEST_F(VerifyCommandTest, FindsMapsThatDisagree) {
@@ -115,13 +120,32 @@ TEST_F(VerifyCommandTest, FindsAFlippedByteOfARecord) {
   }
   const Outcome outcome = Vemo({"verify", uri()});
   EXPECT_EQ(outcome.exitCode, 1);
-  EXPECT_EQ(outcome.out.rfind("root \"tombstones\", object " + std::to_string(leaf.m_value) + ": ", 0), 0u)
+  EXPECT_EQ(outcome.out.rfind(uri() + ": root \"tombstones\", root, object " + std::to_string(leaf.m_value) +
+                                  " (vemo::FieldIdToVectorTombstonesMapLeafNode): malformed bytes at offset ",
+                              0),
+            0u)
       << outcome.out;
   EXPECT_TRUE(outcome.out.ends_with("unreachable: 1 findings\n")) << outcome.out;
   const Outcome dump = Vemo({"dump", uri(), "tombstones"});
   EXPECT_EQ(dump.exitCode, 3);
   EXPECT_NE(dump.err.find("object " + std::to_string(leaf.m_value)), std::string::npos) << dump.err;
   EXPECT_EQ(Vemo({"dump", uri(), "insertions"}).exitCode, 0) << "the rest stays readable";
+}
+
+TEST_F(VerifyCommandTest, PrintsWhatTheEngineFindsInItsFiles) {
+  {
+    const SealFile file(path("space") / kSealFile, uri(), true);
+    CommitSeal seal = *file.Read().Of(file.Read().Newest());
+    seal.freeDigest ^= 1;
+    SealFile(path("space") / kSealFile, uri(), false).Write(seal);
+  }
+  for (const bool isRaw : {false, true}) {
+    const Outcome outcome = isRaw ? Vemo({"verify", uri(), "--raw"}) : Vemo({"verify", uri()});
+    EXPECT_EQ(outcome.exitCode, 1);
+    EXPECT_NE(outcome.out.find("the list of free pages in data.mdb is not the one that was committed\n"), std::string::npos)
+        << outcome.out;
+    EXPECT_TRUE(outcome.out.ends_with("3 maps, 3 entries, 3 nodes, 6 records, 0 unreachable: 1 findings\n")) << outcome.out;
+  }
 }
 
 }  // namespace

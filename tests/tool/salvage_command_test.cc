@@ -94,7 +94,7 @@ TEST_F(SalvageCommandTest, TheRawCheckFindsWhatTheOtherOneFinds) {
   Damage();
   const Outcome outcome = Vemo({"verify", uri(), "--raw"});
   EXPECT_EQ(outcome.exitCode, 1);
-  EXPECT_EQ(outcome.out.rfind("root \"t\", root.0, object " + std::to_string(m_leaf.m_value) + " (", 0), 0u) << outcome.out;
+  EXPECT_EQ(outcome.out.rfind(uri() + ": root \"t\", root.0, object " + std::to_string(m_leaf.m_value) + " (", 0), 0u) << outcome.out;
   EXPECT_TRUE(outcome.out.ends_with("unreachable: 1 findings\n")) << outcome.out;
 }
 
