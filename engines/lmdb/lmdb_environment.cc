@@ -13,6 +13,7 @@
 #include <sstream>
 
 #include "engines/fork_count.h"
+#include "engines/lmdb/empty_data.h"
 #include "engines/lmdb/lmdb_error.h"
 #include "engines/lmdb/space_writer.h"
 #include "platform/error.h"
@@ -96,6 +97,7 @@ LmdbEnvironment::LmdbEnvironment(const LmdbOptions& options)
     MakeFolder(m_path, m_name);
   }
   m_claim.emplace(m_path, m_name);
+  if (contents == FolderContents::kNothingYet) MakeEmptyData(m_path, m_name);
   if (contents == FolderContents::kData) ProbeData();
   OpenFlexibly();
   if (!options.create) return;

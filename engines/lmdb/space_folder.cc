@@ -20,7 +20,7 @@ namespace {
 namespace fs = std::filesystem;
 
 bool IsOurs(const fs::path& file) {
-  return file == kDataFile || file == kReadersFile || file == kWriterLockFile || file == kSealFile;
+  return file == kDataFile || file == kUnfinishedDataFile || file == kReadersFile || file == kWriterLockFile || file == kSealFile;
 }
 
 // The first file in `path` that this engine does not make, or nothing.

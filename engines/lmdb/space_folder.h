@@ -9,12 +9,13 @@
 namespace vemo {
 
 inline constexpr const char* kDataFile = "data.mdb";
+inline constexpr const char* kUnfinishedDataFile = "data.mdb.new";  // of a creation under way, or cut off
 inline constexpr const char* kReadersFile = "lock.mdb";
 inline constexpr const char* kWriterLockFile = "writer.lock";
 inline constexpr const char* kSealFile = "data.seal";
 
 enum class FolderContents {
-  kNothingYet,  // an absent or empty folder, or what a creation left that ended before its first byte
+  kNothingYet,  // an absent or empty folder, or what a creation left that ended before there was a data.mdb
   kData,        // a file that LMDB may or may not understand
 };
 

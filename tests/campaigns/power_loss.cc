@@ -38,25 +38,13 @@ struct Image {
 };
 
 constexpr const char* kSound = "sound";
-constexpr const char* kNotMade = "not made";
 
-// A space that nobody was told of can be refused: its maker has to begin again.
-std::unique_ptr<CSpace> OpenAfterLoss(const std::string& uri, const Image& image) {
-  try {
-    return CSpace::Open(uri, {.create = true});
-  } catch (const StoreError&) {
-    if (image.acknowledged) throw;
-    return nullptr;
-  }
-}
-
-// Opens the space, compares it with the model of its commit, and makes one more commit.
+// Opens the space, which is made where the loss came before it was, compares it with the model of its commit, and makes one more commit.
 std::string Judge(const std::string& uri, const Image& image, const std::vector<Workload>& states) {
   const std::uint64_t acknowledged = image.acknowledged.value_or(0);
   std::uint64_t commits = 0;
   {
-    const auto space = OpenAfterLoss(uri, image);
-    if (space == nullptr) return kNotMade;
+    const auto space = CSpace::Open(uri, {.create = true});
     {
       Snapshot snapshot(*space);
       commits = CommitsIn(snapshot);
@@ -118,7 +106,7 @@ class PowerLoss {
     try {
       trace = Record(seed, 1, image.files);
     } catch (const std::exception& error) {
-      if (image.acknowledged) m_verdict.AddFault(image.origin + ", opened and worked on: " + error.what());
+      m_verdict.AddFault(image.origin + ", opened and worked on: " + error.what());
       return;
     }
     m_verdict.Count("second losses");
@@ -175,11 +163,7 @@ class PowerLoss {
       for (; next < m_queue.size(); ++next) {
         const std::string heard = child.Hear();
         if (heard.empty()) break;
-        if (heard == kNotMade) {
-          m_verdict.Count("spaces not made before the loss");
-        } else if (heard != kSound) {
-          m_verdict.AddFault(m_queue[next].origin + ": " + heard);
-        }
+        if (heard != kSound) m_verdict.AddFault(m_queue[next].origin + ": " + heard);
       }
       if (next < m_queue.size()) m_verdict.AddFault(m_queue[next++].origin + ": opening it ends the process");
     }

@@ -4,6 +4,7 @@
 
 #include <cstdlib>
 
+#include "engines/lmdb/empty_data.h"
 #include "engines/lmdb/page_reader.h"
 #include "platform/error.h"
 #include "tests/engines/lmdb_site.h"
@@ -187,6 +188,30 @@ TEST_F(LmdbFolder, ACreationInterruptedBeforeItsFirstByteIsFinished) {
   EXPECT_THROW(OpenAt(space()), SpaceNotFound);
   EXPECT_EQ(NewestContents(*OpenAt(space(), true)), Contents());
   EXPECT_EQ(NewestContents(*OpenAt(space())), Contents());
+}
+
+TEST_F(LmdbFolder, WhatAnInterruptedCreationHasNotFinishedIsMadeAnew) {
+  for (const std::string& unfinished : {std::string(), std::string("half a page"), std::string(20'000, 'x')}) {
+    fs::remove_all(space());
+    fs::create_directory(space());
+    WriteFile(space() / "data.mdb.new", unfinished);
+    EXPECT_THROW(OpenAt(space()), SpaceNotFound);
+    EXPECT_EQ(NewestContents(*OpenAt(space(), true)), Contents());
+    EXPECT_EQ(FilesIn(space()), kSpaceFiles);
+    EXPECT_EQ(NewestContents(*OpenAt(space())), Contents());
+  }
+}
+
+TEST_F(LmdbFolder, TheFirstDataIsByteForByteWhatLmdbMakes) {
+  fs::create_directory(space());
+  MakeEmptyData(space(), "space");
+  const fs::path other = parent() / "other";
+  fs::create_directory(other);
+  MDB_env* env = nullptr;
+  ASSERT_EQ(mdb_env_create(&env), 0);
+  ASSERT_EQ(mdb_env_open(env, other.c_str(), 0, 0644), 0);
+  mdb_env_close(env);
+  EXPECT_TRUE(ReadFile(space() / "data.mdb") == ReadFile(other / "data.mdb"));
 }
 
 TEST_F(LmdbFolder, ACreationInterruptedBeforeItsCommitIsFinished) {
