@@ -1,5 +1,4 @@
 // Runs one campaign: campaign NAME [--seed N] [--OPTION N]... The last line is the verdict.
-#include <charconv>
 #include <functional>
 #include <iostream>
 #include <map>
@@ -10,6 +9,7 @@
 #include "tests/campaigns/damage.h"
 #include "tests/campaigns/fault_sweep.h"
 #include "tests/campaigns/kill_loop.h"
+#include "tests/campaigns/numbers.h"
 #include "tests/campaigns/power_loss.h"
 #include "tests/campaigns/races.h"
 #include "tests/campaigns/soak.h"
@@ -17,38 +17,6 @@
 namespace vemo::campaign {
 
 namespace {
-
-// The numbers of the command line by name. Each is to be asked for, so that a misspelt one is found.
-class Numbers {
- public:
-  Numbers(int argc, char** argv) {
-    for (int i = 2; i < argc; i += 2) {
-      const std::string_view name(argv[i]);
-      const std::string_view text(i + 1 < argc ? argv[i + 1] : "");
-      std::uint64_t value = 0;
-      const auto result = std::from_chars(text.data(), text.data() + text.size(), value);
-      if (!name.starts_with("--") || result.ec != std::errc() || result.ptr != text.data() + text.size()) {
-        throw std::invalid_argument(std::string(name) + ": options are --NAME NUMBER");
-      }
-      m_values[std::string(name.substr(2))] = value;
-    }
-  }
-
-  template <class Number>
-  void Take(const std::string& name, Number& number) {
-    const auto found = m_values.find(name);
-    if (found == m_values.end()) return;
-    number = static_cast<Number>(found->second);
-    m_values.erase(found);
-  }
-
-  void RequireAllTaken() const {
-    if (!m_values.empty()) throw std::invalid_argument("there is no option --" + m_values.begin()->first);
-  }
-
- private:
-  std::map<std::string, std::uint64_t> m_values;
-};
 
 Verdict KillLoop(Numbers& numbers) {
   KillLoopOptions options;
