@@ -27,6 +27,12 @@ void VectorOfByte::reserve(ssize_t wanted) {
   }
 }
 
+void VectorOfByte::AssignSlowly(const VectorOfByte& other) {
+  clear();
+  std::byte* const copy = insertbytes(0, other.size());
+  if (other.size() > 0) std::memcpy(copy, other.data(), static_cast<std::size_t>(other.size()));
+}
+
 std::byte* VectorOfByte::insertbytes(ssize_t position, ssize_t count) {
   const ssize_t old = size();
   reserve(old + count);

@@ -3,6 +3,7 @@
 
 #include <cstddef>
 #include <cstdint>
+#include <cstring>
 
 #include "platform/types.h"
 
@@ -36,6 +37,15 @@ class VectorOfByte {
   // Makes the capacity `capacity` bytes where it is smaller; filling up to `capacity` bytes does not throw from then on.
   void reserve(ssize_t capacity);
 
+  // Replaces the contents by those of `other`, another buffer. The capacity grows to the exact need; a failed allocation
+  // leaves the buffer empty.
+  void assign(const VectorOfByte& other) {
+    if (m_onHeap || other.m_onHeap) return AssignSlowly(other);
+    std::memcpy(m_inline, other.m_inline, sizeof(m_inline));  // all of it: a constant count is copied without a call
+    m_inlineSize = other.m_inlineSize;
+    if (m_inlineCapacity < m_inlineSize) m_inlineCapacity = m_inlineSize;
+  }
+
   // Opens a gap of `count` bytes at `position` (0..size()) and returns its start; null in a buffer without capacity. Needs
   // no more than the exact capacity.
   std::byte* insertbytes(ssize_t position, ssize_t count);
@@ -64,6 +74,7 @@ class VectorOfByte {
       m_inlineSize = static_cast<std::uint8_t>(size);
     }
   }
+  void AssignSlowly(const VectorOfByte& other);
   void FreeHeap() noexcept;
   void MoveToHeap(ssize_t capacity);
 

@@ -37,7 +37,7 @@ class xvector {
   xvector(xvector&& other) noexcept { swap(other); }
   // Leaves the vector empty when the copy cannot be allocated.
   xvector& operator=(const xvector& other) {
-    if (this != &other) assign(other.begin(), other.end());
+    if (this != &other) m_buffer.assign(other.m_buffer);
     return *this;
   }
   // Leaves `other` with what this vector held.

@@ -2,6 +2,7 @@
 
 #include <gtest/gtest.h>
 
+#include <algorithm>
 #include <cstring>
 #include <new>
 #include <string>
@@ -117,6 +118,30 @@ TEST(VectorOfByte, AFailedAllocationLeavesTheBufferAsItWas) {
     EXPECT_EQ(Contents(buffer), text);
     EXPECT_EQ(buffer.capacity(), static_cast<ssize_t>(text.size()));
   }
+}
+
+TEST(VectorOfByte, AssigningTakesTheContentsAndNoMoreCapacityThanTheyNeed) {
+  for (const std::size_t from : {0u, 3u, 32u, 33u, 80u}) {
+    for (const std::size_t to : {0u, 5u, 32u, 40u, 100u}) {
+      VectorOfByte source, target;
+      Append(source, std::string(from, 's'));
+      source.reserve(static_cast<ssize_t>(from) + 7);
+      Append(target, std::string(to, 't'));
+      target.assign(source);
+      EXPECT_EQ(Contents(target), std::string(from, 's'));
+      EXPECT_EQ(target.capacity(), static_cast<ssize_t>(std::max(from, to)));
+      EXPECT_EQ(Contents(source), std::string(from, 's'));
+    }
+  }
+}
+
+TEST(VectorOfByte, AnAssignmentThatCannotBeAllocatedLeavesTheBufferEmpty) {
+  VectorOfByte source, target;
+  Append(source, std::string(50, 's'));
+  Append(target, "abc");
+  const test::FailingAllocation fail(1);
+  EXPECT_THROW(target.assign(source), std::bad_alloc);
+  EXPECT_EQ(target.size(), 0);
 }
 
 TEST(VectorOfByte, FewBytesNeedNoAllocation) {
