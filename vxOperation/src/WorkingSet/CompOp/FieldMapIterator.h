@@ -1,6 +1,7 @@
 // A position in the chain of leaves.
 #pragma once
 
+#include <cstddef>
 #include <utility>
 
 #include "platform/assertion.h"
@@ -22,8 +23,11 @@ struct FieldMapIteratorPolicy {
     VEMO_ASSERT_TEXT(m_leaf, "m_leaf");
     VEMO_ASSERT(-1 <= m_offset && m_offset < m_leaf->m_numKeyEntrys);
     ++m_offset;
-    if (m_offset == m_leaf->m_numKeyEntrys) {
-      if (Leaf* following = m_leaf->m_next.Get()) *this = {following, 0};
+    if (m_offset == m_leaf->m_numKeyEntrys) [[unlikely]] {
+      if (Leaf* following = m_leaf->m_next.Get()) {
+        *this = {following, 0};
+        PrefetchBehind(following);
+      }
     }
   }
 
@@ -60,6 +64,15 @@ struct FieldMapIteratorPolicy {
   void AssertAtEntry() const {
     VEMO_ASSERT_TEXT(m_leaf, "m_leaf");
     VEMO_ASSERT(0 <= m_offset && m_offset < m_leaf->m_numKeyEntrys);
+  }
+
+  // Asks for the head of the leaf behind `leaf`, so that it is there when a walk has gone through the entries between. A leaf
+  // that is not in memory is not loaded for this.
+  static void PrefetchBehind(const Leaf* leaf) noexcept {
+    constexpr std::size_t kCacheLine = 64, kBytes = 8 * kCacheLine;
+    const auto* behind = static_cast<const std::byte*>(leaf->m_next.m_ptr.m_self);
+    if (behind == nullptr) return;
+    for (std::size_t i = 0; i < kBytes; i += kCacheLine) __builtin_prefetch(behind + i);
   }
 };
 
