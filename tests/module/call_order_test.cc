@@ -45,6 +45,33 @@ TEST_F(CallOrder, InsertionIntoALeafWithRoomMarksMapAndLeaf) {
   EXPECT_EQ(Tree(), "[1 2 3]");
 }
 
+TEST_F(CallOrder, InsertionBehindAllOthersMarksMapAndLeaf) {
+  Build("([1 2] 10 [10 11])");
+  EXPECT_EQ(CallsOfInsert(12), "dirty map\ndirty leaf2\ndirty leaf2\n");
+  EXPECT_EQ(Tree(), "([1 2] 10 [10 11 12])");
+  map[Key(13)] = MakePayload(13);
+  EXPECT_EQ(Calls(), "dirty map\ndirty leaf2\n");
+  EXPECT_EQ(Tree(), "([1 2] 10 [10 11 12 13])");
+}
+
+TEST_F(CallOrder, CopyingMakesTheCallsOfInsertingInOrder) {
+  Build("[1 2]");
+  host.log().Clear();
+  const SmallMap copy(map);
+  EXPECT_EQ(host.log().FullText(),
+            "register leaf2\n"
+            "set leaf2\n"
+            "set leaf2\n"
+            "dirty stack map\n"
+            "reach stack map leaf2\n"
+            "dirty stack map\n"
+            "dirty leaf2\n"
+            "dirty leaf2\n"
+            "dirty stack map\n"
+            "dirty leaf2\n"
+            "dirty leaf2\n");
+}
+
 TEST_F(CallOrder, InsertAndSubscriptOfAnExistingKey) {
   Build("[1 3]");
   EXPECT_FALSE(map.Insert(Key(1), MakePayload(7), false));

@@ -283,10 +283,13 @@ class TFieldMap : public PersistableMixin<IObjectBaseMixin<typename Traits::Map,
   std::vector<LoadedNode> LoadLevel(std::vector<LoadedNode>& children, ssize_t perNode);
   IteratorPolicy BoundPosition(LeafNode* leaf, ssize_t j) const;
 
-  void Append(const value_type& entry);
   static void AssignPayload(wFindRet& ret, PayloadArgument<Payload>& argument);
   void MakeRootLeaf();
   void GrowRoot(InternalKeyEntry& splitEntry);
+  LeafNode* LeafToAppendTo(const FieldId& key) const noexcept;
+  void AppendToLeaf(wFindRet& ret, LeafNode* last, const FieldId& key);
+  void CountNewEntry(wFindRet& ret);
+  static void FillSlot(wFindRet& ret, LeafNode* leaf, ssize_t slot, PendingValue<FieldId>& key);
   static void PlaceNewEntry(LeafNode* leaf, ssize_t slot, PendingValue<FieldId>& key);
   LeafNode* LinkRightLeaf(LeafNode* leaf);
   void SplitLeaf(wFindRet& ret, LeafNode* leaf, LeafNode* right, ssize_t insertPos, PendingValue<FieldId>& key);

@@ -21,10 +21,32 @@ void TFieldMap<Traits>::wFind(wFindRet& ret, const FieldId& key, bool create, Pa
   if (m_height == -1) MakeRootLeaf();
   VEMO_ASSERT(m_height >= 0);
   VEMO_ASSERT(m_root);
-  InternalKeyEntry splitEntry;
-  wFindInNode(ret, m_root.GetAs(TableAt(m_height)), m_height, key, splitEntry, create, argument);
-  if (splitEntry.m_ptr) GrowRoot(splitEntry);
+  if (LeafNode* last = create ? LeafToAppendTo(key) : nullptr) {
+    AppendToLeaf(ret, last, key);
+  } else {
+    InternalKeyEntry splitEntry;
+    wFindInNode(ret, m_root.GetAs(TableAt(m_height)), m_height, key, splitEntry, create, argument);
+    if (splitEntry.m_ptr) GrowRoot(splitEntry);
+  }
   scope.Complete();
+}
+
+// Keys often come in ascending order. One behind all others, where the last leaf is in memory and has room, is inserted
+// without the way down and the search; the changes and the calls are the same.
+template <class Traits>
+inline typename Traits::LeafNode* TFieldMap<Traits>::LeafToAppendTo(const FieldId& key) const noexcept {
+  LeafNode* const last = AsLeafNode(m_lastLeaf.m_ptr.m_self);
+  if (last == nullptr || last->m_next) return nullptr;
+  const ssize_t nk = last->m_numKeyEntrys;
+  return 0 < nk && nk < kCapacity && CompareKeys(key, last->GetEntry(nk - 1).first) > 0 ? last : nullptr;
+}
+
+// No entry moves, so that a payload which is to be assigned may lie in any.
+template <class Traits>
+void TFieldMap<Traits>::AppendToLeaf(wFindRet& ret, LeafNode* last, const FieldId& key) {
+  PendingValue<FieldId> newKey(key);
+  CountNewEntry(ret);
+  FillSlot(ret, last, last->m_numKeyEntrys, newKey);
 }
 
 template <class Traits>
@@ -81,9 +103,13 @@ typename Traits::LeafNode* TFieldMap<Traits>::wFindInLeaf(wFindRet& ret, LeafNod
   VEMO_ASSERT(left);
   const ssize_t nk = left->m_numKeyEntrys;
   VEMO_ASSERT_TEXT(0 <= nk && nk <= kCapacity, "0 <= nk && nk <= 100");
-  ssize_t lo = 0, hi = nk - 1;  // keys below lo are < key, keys above hi are > key
-  while (lo <= hi) {
+  ssize_t lo = 0, hi = kCapacity;  // keys below lo are < key, slots from hi on have keys > key or none
+  while (lo < hi) {
     const ssize_t mid = (lo + hi) / 2;
+    if (mid >= nk) {
+      hi = mid;
+      continue;
+    }
     VEMO_ASSERT(0 <= mid && mid < nk);
     const int c = CompareKeys(key, left->GetEntry(mid).first);
     if (c == 0) {
@@ -91,7 +117,7 @@ typename Traits::LeafNode* TFieldMap<Traits>::wFindInLeaf(wFindRet& ret, LeafNod
       return nullptr;
     }
     if (c < 0) {
-      hi = mid - 1;
+      hi = mid;
     } else {
       lo = mid + 1;
     }
@@ -103,21 +129,32 @@ typename Traits::LeafNode* TFieldMap<Traits>::wFindInLeaf(wFindRet& ret, LeafNod
   }
   if (argument != nullptr) argument->HoldIfWithin(left->m_entrys.Slot(0), left->m_entrys.Slot(nk));
   PendingValue<FieldId> newKey(key);
-  ret.m_created = true;
-  ++m_size;
-  this->MarkAsDirtyWithoutTrace();
+  CountNewEntry(ret);
   VEMO_ASSERT(0 <= insertPos && insertPos <= nk);
   if (nk != kCapacity) {
     ShiftLeafEntries(left, insertPos, insertPos + 1, nk - insertPos);
-    PlaceNewEntry(left, insertPos, newKey);
-    ++left->m_numKeyEntrys;
-    ret = {left, &left->GetEntry(insertPos).second, left, insertPos, true};
-    left->MarkAsDirtyWithoutTrace();
+    FillSlot(ret, left, insertPos, newKey);
     return nullptr;
   }
   LeafNode* right = LinkRightLeaf(left);
   SplitLeaf(ret, left, right, insertPos, newKey);
   return right;
+}
+
+template <class Traits>
+void TFieldMap<Traits>::CountNewEntry(wFindRet& ret) {
+  ret.m_created = true;
+  ++m_size;
+  this->MarkAsDirtyWithoutTrace();
+}
+
+// Makes the new entry in a slot that was freed for it.
+template <class Traits>
+void TFieldMap<Traits>::FillSlot(wFindRet& ret, LeafNode* leaf, ssize_t slot, PendingValue<FieldId>& key) {
+  PlaceNewEntry(leaf, slot, key);
+  ++leaf->m_numKeyEntrys;
+  ret = {leaf, &leaf->GetEntry(slot).second, leaf, slot, true};
+  leaf->MarkAsDirtyWithoutTrace();
 }
 
 // Puts the key and a default payload into a raw slot; cannot throw.

@@ -11,24 +11,19 @@ namespace vemo {
 
 template <class Traits>
 TFieldMap<Traits>::TFieldMap(const TFieldMap& other) : TFieldMap() {
-  for (const value_type& entry : other) Append(entry);
-}
-
-// Inserts an entry that is behind all others. Where the last leaf has room, what insertion does there is done without the way
-// down to it.
-template <class Traits>
-void TFieldMap<Traits>::Append(const value_type& entry) {
-  LeafNode* const last = AsLeafNode(m_lastLeaf.m_ptr.m_self);
-  if (last == nullptr || last->m_numKeyEntrys == kCapacity) {
-    insert(entry);
-    return;
+  for (const value_type& entry : other) {
+    LeafNode* const last = LeafToAppendTo(entry.first);
+    if (last == nullptr) {
+      insert(entry);
+      continue;
+    }
+    MutationScope scope(this->GetThisAsFinalClass());
+    wFindRet ret;
+    AppendToLeaf(ret, last, entry.first);
+    *ret.m_payload = entry.second;
+    MarkPersistentAsDirtyWithoutTrace(ret.m_containingNode);
+    scope.Complete();
   }
-  MutationScope scope(this->GetThisAsFinalClass());
-  PayloadArgument<Payload> argument(entry.second);
-  wFindRet ret;
-  wFindInLeaf(ret, last, entry.first, true, &argument);
-  AssignPayload(ret, argument);
-  scope.Complete();
 }
 
 template <class Traits>
