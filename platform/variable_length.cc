@@ -15,6 +15,10 @@ std::uint8_t* SerialiseLongVariableLengthUint64(std::uint8_t* p, std::uint64_t v
 }
 
 const std::uint8_t* DeserialiseLongVariableLengthUint64(const std::uint8_t* p, std::uint64_t& value) noexcept {
+  if (*p == 0xFF) [[likely]] {  // most ids of 64 bits are drawn at random
+    value = DeserialiseVariableLengthUint64FromNine(p, 9);
+    return p + 9;
+  }
   const std::size_t following = VariableLengthBytes(*p) - 1;
   std::uint64_t x = following >= 7 ? 0 : *p & (0x7Fu >> following);
   for (std::size_t i = 1; i <= following; ++i) x = x << 8 | p[i];

@@ -17,6 +17,7 @@
 #include <bit>
 #include <cstddef>
 #include <cstdint>
+#include <cstring>
 
 namespace vemo {
 
@@ -93,6 +94,18 @@ inline const std::uint8_t* DeserialiseVariableLengthUint64(const std::uint8_t* p
 // The length in bytes of the form whose first byte is `first`: 1 to 9.
 inline std::size_t VariableLengthBytes(std::uint8_t first) noexcept {
   return 1u + static_cast<std::size_t>(std::countl_one(first));
+}
+
+// The value of the form of `length` bytes at `p`, where nine bytes can be read whatever its length: without a branch for each.
+inline std::uint64_t DeserialiseVariableLengthUint64FromNine(const std::uint8_t* p, std::size_t length) noexcept {
+  std::uint64_t behind;
+  std::memcpy(&behind, p + 1, sizeof(behind));
+  behind = __builtin_bswap64(behind);
+  if (length > sizeof(behind)) return behind;
+  const std::uint64_t top = *p & (0xFFu >> length);
+  const std::size_t following = length - 1;
+  // Shifted in two steps: a shift by all 64 bits, where nothing follows, is none.
+  return top << (8 * following) | behind >> 1 >> (63 - 8 * following);
 }
 
 }  // namespace vemo

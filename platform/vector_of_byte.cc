@@ -19,12 +19,8 @@ void VectorOfByte::MoveToHeap(ssize_t capacity) {
   m_onHeap = true;
 }
 
-void VectorOfByte::reserve(ssize_t wanted) {
-  if (m_onHeap ? wanted > m_heap.capacity : wanted > kInlineBytes) {
-    MoveToHeap(std::max(wanted, capacity()));
-  } else if (!m_onHeap && wanted > m_inlineCapacity) {
-    m_inlineCapacity = static_cast<std::uint8_t>(wanted);
-  }
+void VectorOfByte::ReserveOnHeap(ssize_t wanted) {
+  if (!m_onHeap || wanted > m_heap.capacity) MoveToHeap(std::max(wanted, capacity()));
 }
 
 void VectorOfByte::AssignSlowly(const VectorOfByte& other) {
@@ -43,17 +39,14 @@ std::byte* VectorOfByte::insertbytes(ssize_t position, ssize_t count) {
   return gap;
 }
 
-std::byte* VectorOfByte::appendbytes(ssize_t count) {
-  const ssize_t old = size();
-  const ssize_t needed = old + count;
+void VectorOfByte::GrowToAppend(ssize_t count) {
+  const ssize_t needed = size() + count;
   const ssize_t grown = capacity() < needed ? needed + capacity() : capacity();
   if (m_onHeap || needed > kInlineBytes) {
-    reserve(grown);
+    ReserveOnHeap(grown);
   } else {
     m_inlineCapacity = static_cast<std::uint8_t>(grown);
   }
-  SetSize(needed);
-  return data() + old;
 }
 
 void VectorOfByte::erasebytes(ssize_t position, ssize_t count) noexcept {

@@ -35,7 +35,13 @@ class VectorOfByte {
   void clear() noexcept { SetSize(0); }
 
   // Makes the capacity `capacity` bytes where it is smaller; filling up to `capacity` bytes does not throw from then on.
-  void reserve(ssize_t capacity);
+  void reserve(ssize_t capacity) {
+    if (m_onHeap || capacity > kInlineBytes) {
+      ReserveOnHeap(capacity);
+    } else if (capacity > m_inlineCapacity) {
+      m_inlineCapacity = static_cast<std::uint8_t>(capacity);
+    }
+  }
 
   // Replaces the contents by those of `other`, another buffer. The capacity grows to the exact need; a failed allocation
   // leaves the buffer empty.
@@ -52,7 +58,12 @@ class VectorOfByte {
 
   // Appends `count` bytes and returns their start. A buffer that is too small grows to the needed size plus its old
   // capacity, so that appending costs amortised constant time.
-  std::byte* appendbytes(ssize_t count);
+  std::byte* appendbytes(ssize_t count) {
+    const ssize_t old = size();
+    if (old + count > (m_onHeap ? m_heap.capacity : kInlineBytes) || old + count > capacity()) GrowToAppend(count);
+    SetSize(old + count);
+    return data() + old;
+  }
 
   // Removes the bytes [position, position + count).
   void erasebytes(ssize_t position, ssize_t count) noexcept;
@@ -75,6 +86,8 @@ class VectorOfByte {
     }
   }
   void AssignSlowly(const VectorOfByte& other);
+  void ReserveOnHeap(ssize_t capacity);
+  void GrowToAppend(ssize_t count);
   void FreeHeap() noexcept;
   void MoveToHeap(ssize_t capacity);
 

@@ -221,18 +221,21 @@ void TPtoQMap<T>::Deserialise(InputArchive& ar) {
   DeserialiseVariableLengthUint(ar, n);
   VEMO_ASSERT(0 <= n);
   m_tombstones.clear();
+  m_tombstones.ReserveMore(n);
+  const std::uint8_t* p = ar.ptr();
   T position = 0;
   for (; n > 0; --n) {
     T dt = 0;
-    DeserialiseVariableLengthUint(ar, dt);
+    p = DeserialiseVariableLengthInteger(p, dt);
     VEMO_ASSERT(0 <= dt);
     T size = 0;
-    DeserialiseVariableLengthUint(ar, size);
+    p = DeserialiseVariableLengthInteger(p, size);
     VEMO_ASSERT(0 <= size);
     const T t1 = position + dt;
     position = t1 + size;
     m_tombstones.safe_push_back({t1, position});
   }
+  ar.SetPtr(p);
 }
 
 template <class T>

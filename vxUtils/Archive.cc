@@ -28,8 +28,6 @@ void Serialise(Archive& ar, const OID& oid) {
   ar.EndWrite(SerialiseVariableLengthUint64(ar.BeginWrite(kMaxVariableLengthUint64Bytes), oid.m_value));
 }
 
-void Deserialise(InputArchive& ar, OID& oid) { ar.SetPtr(DeserialiseVariableLengthUint64(ar.ptr(), oid.m_value)); }
-
 void Serialise(Archive& ar, const FieldId& field) {
   const std::size_t mostBytes = kMaxVariableLengthUint64Bytes + (1 + std::size_t{field.path.size()}) * MAX_VARIABLE_LENGTH_UINT_SIZE;
   if (std::uint8_t* p = ar.BeginWriteIfRoom(mostBytes)) {
@@ -45,10 +43,11 @@ void Serialise(Archive& ar, const FieldId& field) {
 }
 
 void Deserialise(InputArchive& ar, FieldId& field) {
-  Deserialise(ar, field.oid);
+  const std::uint8_t* p = DeserialiseVariableLengthUint64(ar.ptr(), field.oid.m_value);
   std::uint32_t size = 0;
-  DeserialiseVariableLengthUint(ar, size);
-  for (Path::Element& element : field.path.Resize(size)) DeserialiseVariableLengthUint(ar, element);
+  p = DeserialiseVariableLengthUint32(p, size);
+  for (Path::Element& element : field.path.Resize(size)) p = DeserialiseVariableLengthUint32(p, element);
+  ar.SetPtr(p);
 }
 
 }  // namespace vemo

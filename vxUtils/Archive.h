@@ -149,7 +149,9 @@ inline void Deserialise(InputArchive& ar, Guid& guid) noexcept { ar.DeserialiseP
 
 // An id is one variable-length 64-bit value; a FieldId is its object id, the number of steps and each step.
 void Serialise(Archive& ar, const OID& oid);
-void Deserialise(InputArchive& ar, OID& oid);
+inline void Deserialise(InputArchive& ar, OID& oid) noexcept {
+  ar.SetPtr(DeserialiseVariableLengthUint64(ar.ptr(), oid.m_value));
+}
 void Serialise(Archive& ar, const FieldId& field);
 void Deserialise(InputArchive& ar, FieldId& field);
 

@@ -13,7 +13,11 @@ std::uint64_t BoundedReader::ReadLongUint64() {
   const std::size_t length = VariableLengthBytes(*p);
   if (length > remaining()) Fail("the bytes end inside a number");
   std::uint64_t value = 0;
-  DeserialiseVariableLengthUint64(p, value);
+  if (remaining() > sizeof(value)) [[likely]] {
+    value = DeserialiseVariableLengthUint64FromNine(p, length);
+  } else {
+    DeserialiseVariableLengthUint64(p, value);
+  }
   // A form one byte shorter holds 7 bits less.
   if (length > 1 && value >> (7 * (length - 1)) == 0) Fail("a number is not in its shortest form");
   m_offset += length;

@@ -77,6 +77,17 @@ TEST(VariableLength, ReadsValueAndLengthBack) {
   }
 }
 
+TEST(VariableLength, ReadsTheValueFromNineBytesWhateverFollows) {
+  for (Golden golden : kGolden) {
+    const std::size_t length = golden.bytes.size();
+    for (const std::uint8_t behind : {0x00, 0xFF}) {
+      golden.bytes.resize(length);
+      golden.bytes.resize(9, behind);
+      EXPECT_EQ(DeserialiseVariableLengthUint64FromNine(golden.bytes.data(), length), golden.value);
+    }
+  }
+}
+
 TEST(VariableLength, TheFirstByteTellsTheLength) {
   for (const Golden& golden : kGolden) EXPECT_EQ(VariableLengthBytes(golden.bytes[0]), golden.bytes.size());
 }

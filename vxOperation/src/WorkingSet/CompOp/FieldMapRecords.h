@@ -108,12 +108,10 @@ void TFieldMapLeafNode<Traits>::Deserialise(InputArchive& ar) {
   ResizeArrayElements(m_entrys.Slot(0), m_numKeyEntrys, n);
   m_numKeyEntrys = n;
   for (ssize_t i = 0; i < n; ++i) {
-    FieldId key;
-    ar >> key;
     // The key of an entry is constant, so it is replaced rather than assigned.
     const FieldId* place = &GetEntry(i).first;
     std::destroy_at(place);
-    ::new (const_cast<void*>(static_cast<const void*>(place))) FieldId(std::move(key));
+    ar >> *::new (const_cast<void*>(static_cast<const void*>(place))) FieldId;
     ar >> GetEntry(i).second;
   }
 }
