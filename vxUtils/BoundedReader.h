@@ -44,6 +44,12 @@ class BoundedReader {
   Guid ReadGuid();
   FieldId ReadFieldId();
 
+  // Passes over `count` bytes.
+  void Skip(std::size_t count) {
+    if (count > remaining()) Fail("the bytes end too early");
+    m_offset += count;
+  }
+
   void ExpectEnd() const;
   [[noreturn]] void Fail(const std::string& reason) const { throw MalformedBytes(m_offset, reason); }
 

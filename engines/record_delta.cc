@@ -1,0 +1,117 @@
+#include "engines/record_delta.h"
+
+#include <algorithm>
+#include <cstring>
+
+#include "platform/error.h"
+#include "platform/variable_length.h"
+#include "vxUtils/BoundedReader.h"
+
+namespace vemo {
+
+namespace {
+
+// Stretches that agree in so many bytes are taken to be the same.
+constexpr std::size_t kAnchorBytes = 8;
+// How far from where two versions part they are compared at every pair of distances.
+constexpr std::size_t kNearBytes = 24;
+// How far the one may have grown or shrunk against the other.
+constexpr std::size_t kFarBytes = 1024;
+
+std::size_t CommonPrefix(ByteView a, ByteView b) noexcept {
+  const std::size_t most = std::min(a.size(), b.size());
+  std::size_t n = 0;
+  for (std::uint64_t x, y; n + sizeof(x) <= most; n += sizeof(x)) {
+    std::memcpy(&x, a.data() + n, sizeof(x));
+    std::memcpy(&y, b.data() + n, sizeof(y));
+    if (x != y) break;
+  }
+  while (n < most && a[n] == b[n]) ++n;
+  return n;
+}
+
+std::uint64_t Anchor(ByteView bytes, std::size_t at) noexcept {
+  std::uint64_t anchor;
+  static_assert(sizeof(anchor) == kAnchorBytes);
+  std::memcpy(&anchor, bytes.data() + at, sizeof(anchor));
+  return anchor;
+}
+
+// Where `needle`'s first bytes stand in the first kFarBytes of `bytes`.
+std::optional<std::size_t> FindAnchor(ByteView bytes, ByteView needle) noexcept {
+  const void* found = ::memmem(bytes.data(), std::min(bytes.size(), kFarBytes), needle.data(), kAnchorBytes);
+  if (found == nullptr) return std::nullopt;
+  return static_cast<std::size_t>(static_cast<const std::uint8_t*>(found) - bytes.data());
+}
+
+struct Gap {
+  std::size_t dropped;
+  std::size_t added;
+};
+
+// How much of each side to skip until they agree again: all of both where they do not.
+Gap FindGap(ByteView old, ByteView next) noexcept {
+  if (old.size() >= kAnchorBytes && next.size() >= kAnchorBytes) {
+    const std::size_t oldRange = std::min(kNearBytes, old.size() - kAnchorBytes);
+    const std::size_t nextRange = std::min(kNearBytes, next.size() - kAnchorBytes);
+    for (std::size_t sum = 1; sum <= oldRange + nextRange; ++sum) {
+      for (std::size_t dropped = sum > nextRange ? sum - nextRange : 0; dropped <= std::min(sum, oldRange); ++dropped) {
+        if (Anchor(old, dropped) == Anchor(next, sum - dropped)) return {dropped, sum - dropped};
+      }
+    }
+    if (const auto added = FindAnchor(next, old)) return {0, *added};
+    if (const auto dropped = FindAnchor(old, next)) return {*dropped, 0};
+  }
+  return {old.size(), next.size()};
+}
+
+void AppendNumber(Bytes& bytes, std::size_t number) {
+  std::uint8_t form[kMaxVariableLengthUint64Bytes];
+  bytes.insert(bytes.end(), form, SerialiseVariableLengthUint64(form, number));
+}
+
+}  // namespace
+
+std::optional<Bytes> RecordDelta(ByteView old, ByteView next, std::size_t mostBytes) {
+  Bytes delta;
+  for (;;) {
+    const std::size_t kept = CommonPrefix(old, next);
+    old = old.subspan(kept);
+    next = next.subspan(kept);
+    if (old.empty() && next.empty()) return delta;
+    const Gap gap = FindGap(old, next);
+    if (delta.size() + gap.added > mostBytes) return std::nullopt;
+    AppendNumber(delta, kept);
+    AppendNumber(delta, gap.dropped);
+    AppendNumber(delta, gap.added);
+    delta.insert(delta.end(), next.begin(), next.begin() + static_cast<std::ptrdiff_t>(gap.added));
+    if (delta.size() > mostBytes) return std::nullopt;
+    old = old.subspan(gap.dropped);
+    next = next.subspan(gap.added);
+  }
+}
+
+Bytes ApplyRecordDelta(ByteView old, ByteView delta) {
+  Bytes next;
+  next.reserve(old.size() + delta.size());
+  BoundedReader reader(delta);
+  const auto take = [&](ByteView& from, std::uint64_t count) {
+    if (count > from.size()) reader.Fail("a step goes beyond the end of the old version");
+    const ByteView taken = from.first(count);
+    from = from.subspan(count);
+    return taken;
+  };
+  const auto append = [&](ByteView bytes) { next.insert(next.end(), bytes.begin(), bytes.end()); };
+  while (reader.remaining() > 0) {
+    append(take(old, reader.ReadUint64()));
+    take(old, reader.ReadUint64());
+    const std::uint64_t added = reader.ReadUint64();
+    if (added > reader.remaining()) reader.Fail("a step adds more than there is");
+    append(delta.subspan(reader.offset(), added));
+    reader.Skip(added);
+  }
+  append(old);
+  return next;
+}
+
+}  // namespace vemo

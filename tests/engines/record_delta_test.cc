@@ -1,0 +1,130 @@
+#include "engines/record_delta.h"
+
+#include <gtest/gtest.h>
+
+#include <random>
+#include <string>
+
+#include "platform/error.h"
+#include "tests/support/seed.h"
+
+namespace vemo {
+namespace {
+
+constexpr std::size_t kAnySize = SIZE_MAX;
+
+Bytes ToBytes(const std::string& text) { return {text.begin(), text.end()}; }
+
+Bytes RandomBytes(std::mt19937_64& random, std::size_t size) {
+  Bytes bytes(size);
+  for (std::uint8_t& byte : bytes) byte = static_cast<std::uint8_t>(random());
+  return bytes;
+}
+
+std::size_t DeltaSize(const Bytes& old, const Bytes& next) {
+  const auto delta = RecordDelta(old, next, kAnySize);
+  EXPECT_EQ(ApplyRecordDelta(old, *delta), next);
+  return delta->size();
+}
+
+TEST(RecordDelta, OfEqualVersionsIsEmpty) {
+  EXPECT_EQ(DeltaSize({}, {}), 0u);
+  EXPECT_EQ(DeltaSize(ToBytes("a node of entries"), ToBytes("a node of entries")), 0u);
+}
+
+TEST(RecordDelta, LeadsFromAndToNothing) {
+  EXPECT_EQ(DeltaSize({}, ToBytes("new")), 6u);
+  EXPECT_EQ(DeltaSize(ToBytes("old"), {}), 3u);
+}
+
+TEST(RecordDelta, OfAnInsertionCostsTheInsertion) {
+  std::mt19937_64 random(1);
+  const Bytes old = RandomBytes(random, 1000);
+  Bytes next = old;
+  const Bytes entry = RandomBytes(random, 30);
+  next.insert(next.begin() + 500, entry.begin(), entry.end());
+  EXPECT_LE(DeltaSize(old, next), 40u);
+  EXPECT_LE(DeltaSize(next, old), 10u);
+}
+
+TEST(RecordDelta, OfAFewOverwrittenBytesCostsThose) {
+  std::mt19937_64 random(2);
+  const Bytes old = RandomBytes(random, 1000);
+  Bytes next = old;
+  for (const std::size_t at : {3, 400, 401, 992}) next[at] ^= 0x55;
+  EXPECT_LE(DeltaSize(old, next), 24u);
+}
+
+TEST(RecordDelta, SeesAStretchThatGrewByAFewBytes) {
+  std::mt19937_64 random(3);
+  const Bytes old = RandomBytes(random, 1000);
+  Bytes next = old;
+  const Bytes longer = RandomBytes(random, 9);
+  next.erase(next.begin() + 300, next.begin() + 304);
+  next.insert(next.begin() + 300, longer.begin(), longer.end());
+  EXPECT_LE(DeltaSize(old, next), 24u);
+}
+
+TEST(RecordDelta, IsRefusedWhereItWouldBeTooLong) {
+  std::mt19937_64 random(4);
+  const Bytes old = RandomBytes(random, 500), next = RandomBytes(random, 500);
+  EXPECT_FALSE(RecordDelta(old, next, 250));
+  const auto delta = RecordDelta(old, next, kAnySize);
+  EXPECT_FALSE(RecordDelta(old, next, delta->size() - 1));
+  EXPECT_EQ(RecordDelta(old, next, delta->size()), delta);
+}
+
+TEST(RecordDelta, AppliesToAnyPairOfRandomVersions) {
+  std::mt19937_64 random(test::TestSeed(20261121));
+  for (int round = 0; round < 3000; ++round) {
+    // Few values, so that stretches recur and anchors are found in wrong places too.
+    const std::size_t values = 1 + random() % 6;
+    const auto make = [&](std::size_t most) {
+      Bytes bytes(random() % (most + 1));
+      for (std::uint8_t& byte : bytes) byte = static_cast<std::uint8_t>(random() % values);
+      return bytes;
+    };
+    const Bytes old = make(300);
+    Bytes next = old;
+    for (std::size_t change = random() % 8; change > 0; --change) {
+      const std::size_t from = random() % (next.size() + 1);
+      const std::size_t count = std::min(next.size() - from, random() % 40);
+      next.erase(next.begin() + static_cast<std::ptrdiff_t>(from), next.begin() + static_cast<std::ptrdiff_t>(from + count));
+      const Bytes added = make(40);
+      next.insert(next.begin() + static_cast<std::ptrdiff_t>(from), added.begin(), added.end());
+    }
+    const auto delta = RecordDelta(old, next, kAnySize);
+    ASSERT_EQ(ApplyRecordDelta(old, *delta), next) << "round " << round;
+  }
+}
+
+// Whatever the bytes are, applying ends, with an exception of ours or with a version no larger than both together.
+TEST(RecordDelta, HostileBytesAreRefusedOrApplied) {
+  std::mt19937_64 random(test::TestSeed(20261121));
+  std::size_t refused = 0;
+  for (int round = 0; round < 20000; ++round) {
+    const Bytes old = RandomBytes(random, random() % 60);
+    Bytes delta = RandomBytes(random, random() % 40);
+    for (std::uint8_t& byte : delta) {
+      if (random() % 2 == 0) byte &= 0x0F;
+    }
+    try {
+      ASSERT_LE(ApplyRecordDelta(old, delta).size(), old.size() + delta.size());
+    } catch (const MalformedBytes&) {
+      ++refused;
+    }
+  }
+  EXPECT_GT(refused, 1000u);
+}
+
+TEST(RecordDelta, StepsBeyondTheOldVersionAreRefused) {
+  const Bytes old = ToBytes("old");
+  EXPECT_THROW(ApplyRecordDelta(old, Bytes{4, 0, 0}), MalformedBytes);
+  EXPECT_THROW(ApplyRecordDelta(old, Bytes{2, 2, 0}), MalformedBytes);
+  EXPECT_THROW(ApplyRecordDelta(old, Bytes{1, 1, 2, 'x'}), MalformedBytes);
+  EXPECT_THROW(ApplyRecordDelta(old, Bytes{1, 1}), MalformedBytes);
+  EXPECT_EQ(ApplyRecordDelta(old, Bytes{1, 1, 1, 'x'}), ToBytes("oxd"));
+}
+
+}  // namespace
+}  // namespace vemo
