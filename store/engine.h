@@ -59,7 +59,8 @@ struct StorageFinding {
   std::optional<std::uint64_t> page;  // of the engine's file, where it has pages
 };
 
-// The state after one commit, whatever is committed meanwhile. What it returns stays valid until it is destroyed.
+// The state after one commit, whatever is committed meanwhile. A record that Read returns stays valid until its next call, one that
+// a scan shows until the visit returns, everything else until the snapshot is destroyed.
 // Every function throws StoreError when the engine fails, and DamagedStorage when what it must read is damaged: that a
 // value is absent is an answer only where that is certain. The rest stays readable.
 class EngineSnapshot {

@@ -6,14 +6,17 @@
 #include <cerrno>
 #include <limits>
 #include <map>
+#include <mutex>
 #include <string_view>
 #include <utility>
 
 #include "engines/batch_check.h"
+#include "engines/lmdb/change_log.h"
 #include "engines/lmdb/lmdb_environment.h"
 #include "engines/lmdb/lmdb_error.h"
 #include "engines/lmdb/lmdb_snapshot.h"
 #include "engines/lmdb/lmdb_writer_lock.h"
+#include "engines/lmdb/record_writer.h"
 #include "engines/lmdb/space_writer.h"
 #include "platform/error.h"
 
@@ -24,16 +27,14 @@ constexpr const char* kCommit = "commit to";
 constexpr const char* kReserve = "reserve ids in";
 constexpr const char* kLock = "lock for writing";
 
-void Apply(const CommitBatch& batch, SpaceWriter& writer) {
+void Apply(const CommitBatch& batch, SpaceWriter& writer, ChangeIndex& changes, const SettlingBounds& bounds,
+           SettlingRound& round) {
   const std::uint64_t generation = writer.Numbers().generation;
   if (generation != batch.expectedGeneration) throw StaleGeneration(batch.expectedGeneration, generation);
-  for (const OID oid : batch.removedRecords) writer.RemoveRecord(oid);
-  // In the order of ids, so that neighbours are written while their page is at hand.
-  std::vector<const CommitBatch::Record*> sorted;
-  sorted.reserve(batch.records.size());
-  for (const CommitBatch::Record& record : batch.records) sorted.push_back(&record);
-  std::sort(sorted.begin(), sorted.end(), [](const auto* a, const auto* b) { return a->oid < b->oid; });
-  for (const CommitBatch::Record* record : sorted) writer.PutRecord(record->oid, record->bytes);
+  FollowChanges(changes, writer.reader(), writer.state(), generation);
+  RecordWriter records(writer, changes, bounds, round);
+  records.Write(batch);
+  round = records.round();
   for (const OID oid : batch.finishedDeletions) writer.Unqueue(oid);
   for (const OID oid : batch.queuedDeletions) writer.Queue(oid);
   // Of a name that is there more than once the last value counts.
@@ -52,17 +53,26 @@ void Apply(const CommitBatch& batch, SpaceWriter& writer) {
 class LmdbEngine final : public Engine {
  public:
   explicit LmdbEngine(const LmdbOptions& options)
-      : m_environment(std::make_shared<LmdbEnvironment>(options)) {}
+      : m_environment(std::make_shared<LmdbEnvironment>(options)), m_bounds(options.pendingChanges) {}
 
   std::string Name() const override { return m_environment->name(); }
 
   std::unique_ptr<EngineSnapshot> OpenSnapshot() override {
-    return std::make_unique<LmdbSnapshot>(m_environment);
+    for (;;) {
+      auto snapshot = std::make_unique<LmdbSnapshot>(m_environment);
+      if (snapshot->IsCurrent()) return snapshot;
+    }
   }
 
   std::uint64_t Commit(const CommitBatch& batch) override {
     CheckBatch(batch);
-    m_environment->Write(kCommit, [&](SpaceWriter& writer) { Apply(batch, writer); });
+    const std::lock_guard lock(m_committing);
+    SettlingRound round;
+    m_environment->Write(kCommit, [&](SpaceWriter& writer) {
+      round = m_round;
+      Apply(batch, writer, *m_environment->changes(), m_bounds, round);
+    });
+    m_round = std::move(round);
     return batch.expectedGeneration + 1;
   }
 
@@ -103,6 +113,9 @@ class LmdbEngine final : public Engine {
 
  private:
   std::shared_ptr<LmdbEnvironment> m_environment;
+  const SettlingBounds m_bounds;
+  std::mutex m_committing;  // guards m_round
+  SettlingRound m_round;
 };
 
 }  // namespace

@@ -9,6 +9,13 @@
 
 namespace vemo {
 
+// Commits write what changed of records; later ones write it into the records, so that no more is pending than this.
+struct SettlingBounds {
+  std::uint64_t bytes = std::uint64_t{32} << 20;
+  std::uint64_t commits = 4'096;
+  std::uint64_t records = 50'000;
+};
+
 struct LmdbOptions {
   // The folder of the space. It holds data.mdb, lock.mdb and writer.lock; it must be on a local file system.
   std::filesystem::path path;
@@ -26,6 +33,9 @@ struct LmdbOptions {
   // loss may DAMAGE THE WHOLE SPACE, not only lose its last commits. For spaces that can be made again.
   // Closing syncs.
   bool syncEachCommit = true;
+
+  // How much may be pending. Opening the space reads it.
+  SettlingBounds pendingChanges;
 
   // Refuse commits, reservations and the writer lock, and need no write permission on data.mdb (only on
   // lock.mdb).

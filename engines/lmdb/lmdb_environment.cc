@@ -171,6 +171,7 @@ void LmdbEnvironment::Open(std::size_t mapBytes) {
     if (!m_options.syncEachCommit) flags |= MDB_NOSYNC;
     CheckOpened(mdb_env_open(m_env, m_path.c_str(), flags, kFileMode), m_name);
     m_sealed = std::make_unique<SealedSpace>(m_path, m_name, m_options.readOnly, mapBytes);
+    m_changes = std::make_shared<ChangeIndex>();
     RequireSoundHeader(*m_sealed->file());
     int deadReaders = 0;
     CheckLmdb(mdb_reader_check(m_env, &deadReaders), "open", m_name);

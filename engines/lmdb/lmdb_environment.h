@@ -21,6 +21,7 @@
 #include <string>
 #include <vector>
 
+#include "engines/lmdb/change_index.h"
 #include "engines/lmdb/lmdb_engine.h"
 #include "engines/lmdb/lmdb_layout.h"
 #include "engines/lmdb/sealed_space.h"
@@ -52,6 +53,9 @@ class LmdbEnvironment {
     MDB_txn* txn = nullptr;
     KnownStatePtr known;
   };
+
+  // The changes that the space keeps beside its records.
+  const std::shared_ptr<ChangeIndex>& changes() const noexcept { return m_changes; }
 
   // Reads the newest commit; to be given back to EndSnapshot on any thread. Throws DamagedStorage where what all reading
   // starts from is damaged.
@@ -98,6 +102,7 @@ class LmdbEnvironment {
   std::mutex m_state;
   MDB_env* m_env = nullptr;
   std::unique_ptr<SealedSpace> m_sealed;  // of the open environment
+  std::shared_ptr<ChangeIndex> m_changes = std::make_shared<ChangeIndex>();
   LmdbTables m_tables;
   std::size_t m_mapBytes = 0;
   std::size_t m_openSnapshots = 0;

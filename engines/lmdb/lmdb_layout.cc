@@ -23,6 +23,7 @@ struct TableName {
   const char* name;
 };
 constexpr std::array<TableName, kTableCount> kTables{{{&LmdbTables::records, kRecordsTable.data()},
+                                                      {&LmdbTables::changes, kChangesTable.data()},
                                                       {&LmdbTables::info, "info"},
                                                       {&LmdbTables::roots, "roots"},
                                                       {&LmdbTables::meta, "meta"},
@@ -133,7 +134,13 @@ LmdbTables CreateTables(MDB_txn* txn, const std::string& space) {
   };
   putNumber(kGenerationKey, 0);
   putNumber(kNextIdKey, 1);
+  putNumber(kFirstChangesKey, 0);
+  putNumber(kLastChangesKey, 0);
   return tables;
+}
+
+std::uint64_t CommitStamp(std::uint64_t tag, std::uint64_t commit) noexcept {
+  return XXH3_64bits_withSeed(&commit, sizeof commit, tag);
 }
 
 StoredNumber StoreNumber(std::string_view key, std::uint64_t number) {
@@ -150,6 +157,10 @@ std::uint64_t ReadGeneration(PageReader& reader, const SpaceState& state) {
 
 SpaceNumbers ReadNumbers(PageReader& reader, const SpaceState& state) {
   return {ReadNumber(reader, state, kGenerationKey), ReadNumber(reader, state, kNextIdKey)};
+}
+
+ChangesRange ReadChangesRange(PageReader& reader, const SpaceState& state) {
+  return {ReadNumber(reader, state, kFirstChangesKey), ReadNumber(reader, state, kLastChangesKey)};
 }
 
 }  // namespace vemo

@@ -1,7 +1,8 @@
 // What a space looks like inside LMDB.
 //
 //   table        key                     value
-//   records      object id, 8 bytes BE   tag, the record
+//   records      object id, 8 bytes BE   tag, the commit that wrote it, 8 bytes LE, a stamp of that, the record
+//   changes      commit, 8 bytes BE      tag, what the commit changed of records (change_blob.h)
 //   info         name                    tag, the value
 //   roots        name                    tag, the value
 //   meta         name                    tag, the value
@@ -9,10 +10,12 @@
 //   system       "layout"                "vemo space", then the layout number, 8 bytes BE, then a checksum
 //                "generation"            8 bytes BE, then a checksum
 //                "next id"               8 bytes BE, then a checksum
+//                "first changes"         8 bytes BE, then a checksum: the first commit in the table of changes, or 0
+//                "last changes"          8 bytes BE, then a checksum: the last one, or 0
 //
 // A tag is the XXH3-64 of the key, seeded with the XXH3-64 of the table's name, 8 bytes LE: it tells a value that is
 // reached under a wrong key or in a wrong table. A checksum is the XXH3-64 of the bytes before it, seeded with the tag
-// that the key would have. One transaction makes all of it: an environment has no table at all, or is a whole space, or
+// that the key would have, and so is the stamp of a commit. One transaction makes all of it: an environment has no table at all, or is a whole space, or
 // is somebody else's.
 #pragma once
 
@@ -31,6 +34,7 @@ namespace vemo {
 // Handles of LMDB (MDB_dbi), good for as long as the environment is open.
 struct LmdbTables {
   unsigned records = 0;
+  unsigned changes = 0;
   unsigned info = 0;
   unsigned roots = 0;
   unsigned meta = 0;
@@ -38,11 +42,17 @@ struct LmdbTables {
   unsigned system = 0;
 };
 
-inline constexpr std::uint64_t kLayoutNumber = 2;
-inline constexpr int kTableCount = 6;
+inline constexpr std::uint64_t kLayoutNumber = 3;
+inline constexpr int kTableCount = 7;
 inline constexpr std::string_view kRecordsTable = "records";
+inline constexpr std::string_view kChangesTable = "changes";
 inline constexpr std::string_view kDeletionsTable = "deletions";
 inline constexpr std::string_view kSystemTable = "system";
+
+// Before each record stand the commit that wrote it and the stamp, which tells that this number is not damaged: a record with too
+// high a number would be taken for newer than its changes. `tag` is that of its key.
+inline constexpr std::size_t kCommitBytes = 2 * sizeof(std::uint64_t);
+std::uint64_t CommitStamp(std::uint64_t tag, std::uint64_t commit) noexcept;
 
 // Whether `state` holds a space: false when there is no table at all. Throws IncompatibleSpace for anything else than a
 // space of this layout, DamagedStorage for a damaged one. `space` is the name for messages.
@@ -59,12 +69,20 @@ struct SpaceNumbers {
   std::uint64_t generation = 0;
   std::uint64_t nextId = 1;
 };
+// The first and the last commit in the table of changes; both 0 where there is none.
+struct ChangesRange {
+  std::uint64_t first = 0;
+  std::uint64_t last = 0;
+};
 std::uint64_t ReadGeneration(PageReader& reader, const SpaceState& state);
 SpaceNumbers ReadNumbers(PageReader& reader, const SpaceState& state);
+ChangesRange ReadChangesRange(PageReader& reader, const SpaceState& state);
 
 // The keys and values of the numbers, as they are stored.
 inline constexpr std::string_view kGenerationKey = "generation";
 inline constexpr std::string_view kNextIdKey = "next id";
+inline constexpr std::string_view kFirstChangesKey = "first changes";
+inline constexpr std::string_view kLastChangesKey = "last changes";
 using StoredNumber = std::array<std::uint8_t, 16>;
 StoredNumber StoreNumber(std::string_view key, std::uint64_t number);
 

@@ -28,17 +28,27 @@ LmdbSnapshot::LmdbSnapshot(std::shared_ptr<LmdbEnvironment> environment)
       m_reading(*m_environment),
       m_reader(MakeReader(m_reading.Known().file, State(), m_environment->name())),
       m_records(m_reader, Table(kRecordsTable)),
-      m_generation(ReadGeneration(m_reader, State())) {}
+      m_generation(ReadGeneration(m_reader, State())),
+      m_changes(m_environment->changes(), m_generation),
+      m_isCurrent(FollowChanges(m_changes.Index(), m_reader, State(), m_generation)) {}
 
 std::optional<ByteView> LmdbSnapshot::Read(OID oid) const {
   m_environment->RequireOwnProcess(kOperation);
   if (!m_records.Find(KeyText(ToBigEndian(oid.m_value)))) return std::nullopt;
-  return m_records.Value();
+  return RecordAt(oid, m_records, m_changed);
+}
+
+ByteView LmdbSnapshot::RecordAt(OID oid, const TreeCursor& cursor, Bytes& changed) const {
+  return ReadRecord(oid, m_generation, cursor, m_changes.Index(), m_reader, State(), changed);
 }
 
 void LmdbSnapshot::ScanRecords(OID first, const std::function<bool(OID, ByteView)>& visit) const {
   const BigEndian64 key = ToBigEndian(first.m_value);
-  Scan(kRecordsTable, KeyText(key), [&](TreeCursor& cursor) { return visit(ToOid(cursor), cursor.Value()); });
+  Bytes changed;
+  Scan(kRecordsTable, KeyText(key), [&](TreeCursor& cursor) {
+    const OID oid = ToOid(cursor);
+    return visit(oid, RecordAt(oid, cursor, changed));
+  });
 }
 
 std::optional<ByteView> LmdbSnapshot::ReadNamed(NamedTable table, std::string_view name) const {
@@ -74,6 +84,9 @@ std::vector<StorageFinding> LmdbSnapshot::CheckStorage() const {
   m_environment->RequireOwnProcess("check");
   std::vector<StorageFinding> findings =
       CheckPages(m_reading.Known().file, State(), m_environment->name()).findings;
+  for (const std::uint64_t commit : m_changes.Index().Damaged()) {
+    findings.push_back({"the changes of commit " + std::to_string(commit) + " are damaged", std::nullopt});
+  }
   if (findings.empty() && !m_reading.Known().doubt.empty()) findings.push_back({m_reading.Known().doubt, std::nullopt});
   return findings;
 }

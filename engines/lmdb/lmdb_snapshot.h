@@ -1,7 +1,9 @@
 // A read transaction of LMDB as a snapshot of a space.
 #pragma once
 
+#include <cstdint>
 #include <memory>
+#include <utility>
 
 #include "engines/lmdb/lmdb_environment.h"
 #include "engines/lmdb/tree_cursor.h"
@@ -25,13 +27,31 @@ class OpenReading {
   const LmdbEnvironment::Reading m_reading;
 };
 
+// Keeps the changes that a snapshot of `commit` needs in the index while this object lives.
+class OpenChanges {
+ public:
+  OpenChanges(std::shared_ptr<ChangeIndex> index, std::uint64_t commit) : m_index(std::move(index)), m_commit(commit) {
+    m_index->Open(m_commit);
+  }
+  ~OpenChanges() { m_index->Close(m_commit); }
+  OpenChanges(const OpenChanges&) = delete;
+  OpenChanges& operator=(const OpenChanges&) = delete;
+
+  ChangeIndex& Index() const noexcept { return *m_index; }
+
+ private:
+  const std::shared_ptr<ChangeIndex> m_index;
+  const std::uint64_t m_commit;
+};
+
 // Reads without LMDB (page_reader.h), whose transaction keeps the pages. Views point into the map of data.mdb, which
 // stays while the snapshot is open.
 class LmdbSnapshot final : public EngineSnapshot {
  public:
   explicit LmdbSnapshot(std::shared_ptr<LmdbEnvironment> environment);
-  LmdbSnapshot(const LmdbSnapshot&) = delete;
-  LmdbSnapshot& operator=(const LmdbSnapshot&) = delete;
+
+  // Whether it can be read: false for one that was opened while the changes that it needs were forgotten. Open another.
+  bool IsCurrent() const noexcept { return m_isCurrent; }
 
   std::uint64_t Generation() const override { return m_generation; }
   std::optional<ByteView> Read(OID oid) const override;
@@ -45,6 +65,7 @@ class LmdbSnapshot final : public EngineSnapshot {
  private:
   const SpaceState& State() const noexcept { return *m_reading.Known().state; }
   const PageTable& Table(std::string_view name) const noexcept { return *State().Table(name); }
+  ByteView RecordAt(OID oid, const TreeCursor& cursor, Bytes& changed) const;
   void Scan(std::string_view table, std::string_view first,
             const std::function<bool(TreeCursor&)>& visit) const;
 
@@ -52,7 +73,10 @@ class LmdbSnapshot final : public EngineSnapshot {
   OpenReading m_reading;
   mutable PageReader m_reader;  // remembers the pages that it has checked
   mutable TreeCursor m_records;
-  std::uint64_t m_generation = 0;
+  mutable Bytes m_changed;  // the record that Read has put together last
+  const std::uint64_t m_generation;
+  const OpenChanges m_changes;
+  const bool m_isCurrent;
 };
 
 }  // namespace vemo

@@ -39,6 +39,7 @@ SpaceWriter::SpaceWriter(MDB_txn* txn, const LmdbTables& tables, const KnownStat
       m_space(space),
       m_reader(MakeReader(known.file, *known.state, space)),
       m_records(MakeTable(tables.records, kRecordsTable)),
+      m_changes(MakeTable(tables.changes, kChangesTable)),
       m_info(MakeTable(tables.info, TableNameOf(NamedTable::kInfo))),
       m_roots(MakeTable(tables.roots, TableNameOf(NamedTable::kRoots))),
       m_meta(MakeTable(tables.meta, TableNameOf(NamedTable::kMeta))),
@@ -73,6 +74,31 @@ bool SpaceWriter::Check(Table& table, std::string_view key) {
   return true;
 }
 
+std::optional<StoredRecord> SpaceWriter::Stored(OID oid) {
+  if (!m_records.cursor.Find(IdKey(oid).text())) return std::nullopt;
+  return ReadStoredRecord(m_records.cursor);
+}
+
+ByteView SpaceWriter::CurrentRecord(OID oid, std::uint64_t commit, const ChangeIndex& index, Bytes& changed) {
+  m_records.cursor.Find(IdKey(oid).text());
+  return ReadRecord(oid, commit, m_records.cursor, index, m_reader, state(), changed);
+}
+
+void SpaceWriter::FailChanges(const char* fault) const {
+  m_reader.Fail(m_changes.pages.root.root, m_changes.pages, fault, {});
+}
+
+void SpaceWriter::PutRecord(OID oid, std::uint64_t commit, ByteView record) {
+  const IdKey key(oid);
+  std::uint8_t* room = ReserveTagged(m_records, key.text(), kCommitBytes + record.size());
+  std::uint64_t tag;
+  std::memcpy(&tag, room - kTagBytes, kTagBytes);
+  const std::uint64_t stamp = CommitStamp(tag, commit);
+  std::memcpy(room, &commit, sizeof commit);
+  std::memcpy(room + sizeof commit, &stamp, sizeof stamp);
+  std::memcpy(room + kCommitBytes, record.data(), record.size());
+}
+
 // Room for a value, to be filled at once.
 std::uint8_t* SpaceWriter::Reserve(Table& table, std::string_view key, std::size_t bytes) {
   Check(table, key);
@@ -82,11 +108,17 @@ std::uint8_t* SpaceWriter::Reserve(Table& table, std::string_view key, std::size
   return static_cast<std::uint8_t*>(room.mv_data);
 }
 
-void SpaceWriter::Put(Table& table, std::string_view key, ByteView value) {
-  std::uint8_t* room = Reserve(table, key, kTagBytes + value.size());
+// The same behind a tag.
+std::uint8_t* SpaceWriter::ReserveTagged(Table& table, std::string_view key, std::size_t bytes) {
+  std::uint8_t* room = Reserve(table, key, kTagBytes + bytes);
   const std::uint64_t tag = ValueTag(table.pages.seed, key);
   std::memcpy(room, &tag, kTagBytes);
-  if (!value.empty()) std::memcpy(room + kTagBytes, value.data(), value.size());
+  return room + kTagBytes;
+}
+
+void SpaceWriter::Put(Table& table, std::string_view key, ByteView value) {
+  std::uint8_t* room = ReserveTagged(table, key, value.size());
+  if (!value.empty()) std::memcpy(room, value.data(), value.size());
 }
 
 void SpaceWriter::PutNumber(std::string_view key, std::uint64_t number) {

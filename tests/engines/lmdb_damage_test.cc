@@ -134,10 +134,17 @@ Named EntriesByLmdb(const fs::path& folder, const char* table) {
   return entries;
 }
 
+// A record has the number of its commit before it, and may have changed since: its key is what LMDB can tell.
+std::vector<std::string> Keys(const Named& entries) {
+  std::vector<std::string> keys;
+  for (const auto& [key, value] : entries) keys.push_back(key);
+  return keys;
+}
+
 TEST_P(LmdbDamage, PagesAreReadAsLmdbReadsThem) {
   std::mt19937_64 random(TestSeed(11) + GetParam());
   MakeSpace(GetParam(), random);
-  const Named records = EntriesByLmdb(space(), "records");
+  const std::vector<std::string> records = Keys(EntriesByLmdb(space(), "records"));
   const Named meta = EntriesByLmdb(space(), "meta");
   const Named queue = EntriesByLmdb(space(), "deletions");
   const auto engine = OpenAt(space());
@@ -150,7 +157,7 @@ TEST_P(LmdbDamage, PagesAreReadAsLmdbReadsThem) {
     EXPECT_EQ(ToText(snapshot->Read(oid)), ToText(value));
     return true;
   });
-  EXPECT_EQ(found, records);
+  EXPECT_EQ(Keys(found), records);
   EXPECT_EQ(AllNamed(*snapshot, NamedTable::kMeta), meta);
   EXPECT_EQ(Queue(*snapshot, SIZE_MAX).size(), queue.size());
   EXPECT_TRUE(snapshot->CheckStorage().empty());

@@ -190,14 +190,18 @@ TEST_P(LmdbDisk, SnapshotsStayReadableWhateverFailsAndTheEngineGoesOnAfterThem) 
   BatchBuilder batch;
   batch.Put(1, "one");
   engine->Commit(batch.At(0));
-  bool failed = true;
   int stopped = 0;
-  for (int nth = 1; failed; ++nth) {
+  int survived = 0;  // commits in a row that the fault did not reach
+  constexpr int kCommitsEach = 4;  // they differ in how many writes they take
+  for (int call = 0; survived < kCommitsEach; ++call) {
+    const int nth = 1 + call / kCommitsEach;
     auto snapshot = engine->OpenSnapshot();
     const Contents before = ContentsOf(*snapshot);
+    bool failed = false;
     {
       const FailingDisk disk(nth, StaysBroken());
       failed = CommitFails(*engine, batch.At(before.generation));
+      survived = disk.HasFailed() ? 0 : survived + 1;
     }
     const bool again = failed && !CommitFails(*engine, batch.At(before.generation));
     if (failed && !again) {
@@ -207,10 +211,9 @@ TEST_P(LmdbDisk, SnapshotsStayReadableWhateverFailsAndTheEngineGoesOnAfterThem) 
     }
     ASSERT_EQ(ContentsOf(*snapshot), before) << "call " << nth;
     snapshot.reset();
-    ASSERT_EQ(NewestContents(*engine).generation, before.generation + (failed && !again ? 0 : 1))
-        << "call " << nth;
+    ASSERT_EQ(NewestContents(*engine).generation, before.generation + (failed && !again ? 0 : 1)) << "call " << nth;
   }
-  EXPECT_EQ(stopped, 1);
+  EXPECT_GE(stopped, 1);
 }
 
 TEST_P(LmdbDisk, ASpaceRemovedUnderAStoppedEngineIsNotMadeAnew) {
@@ -229,17 +232,17 @@ TEST_P(LmdbDisk, ASpaceRemovedUnderAStoppedEngineIsNotMadeAnew) {
 }
 
 TEST_P(LmdbDisk, ACreationThatFailsAnywhereCanBeRepeated) {
-  bool failed = true;
+  bool hasFailed = true;
   int failures = 0;
-  for (int nth = 1; failed; ++nth) {
+  for (int nth = 1; hasFailed; ++nth) {
     {
       const FailingDisk disk(nth, StaysBroken());
       try {
-        OpenAt(space(), true);
-        failed = false;
+        OpenAt(space(), true);  // also where what failed was the write of a seal, which a commit does not need
       } catch (const StoreError&) {
         ++failures;
       }
+      hasFailed = disk.HasFailed();
     }
     ASSERT_EQ(NewestContents(*OpenAt(space(), true)), Contents()) << "call " << nth;
     std::filesystem::remove_all(space());

@@ -32,7 +32,7 @@ class Model {
         batch.Remove(oid);
         m_records.erase(oid);
       } else {
-        batch.Put(oid, m_records[oid] = Value());
+        batch.Put(oid, m_records[oid] = m_records.contains(oid) && Below(3) > 0 ? Edited(m_records[oid]) : Value());
       }
     }
     for (std::size_t i = Below(6); i > 0; --i) ChangeName(batch);
@@ -55,6 +55,15 @@ class Model {
  private:
   std::string Value() {
     return std::string(Below(8) == 0 ? Below(9000) : Below(50), static_cast<char>(Below(256)));
+  }
+
+  // The value with a few bytes more, less or different somewhere.
+  std::string Edited(std::string value) {
+    for (std::size_t edit = 1 + Below(3); edit > 0; --edit) {
+      const std::size_t from = Below(value.size() + 1);
+      value.replace(from, Below(12), Below(12), static_cast<char>(Below(256)));
+    }
+    return value;
   }
 
   void ChangeName(BatchBuilder& batch) {

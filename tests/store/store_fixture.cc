@@ -59,6 +59,7 @@ void SpaceSite::Open(SpaceOptions options) {
     lmdb.path = m_folder.path() / "space";
     lmdb.create = true;
     lmdb.syncEachCommit = false;  // these tests cut no power
+    if (Evicts(m_kind)) lmdb.pendingChanges = {.bytes = 2'048, .commits = 6, .records = 24};
     m_engine = OpenLmdbEngine(lmdb);
   } else if (m_engine == nullptr) {
     m_engine = OpenMemoryEngine();

@@ -27,7 +27,8 @@ using InsertionsMap = FieldIdToVectorInsertionsMap;
 using TombstonesMap = FieldIdToVectorTombstonesMap;
 using HistoriesMap = FieldIdToVectorInsertionsAndDeletionsMap;
 
-// The engine of a space, and with an evicting kind, that no unchanged node stays in memory from one transaction to the next.
+// The engine of a space, and with an evicting kind, that no unchanged node stays in memory from one transaction to the next; LMDB also
+// writes changes into their records soon.
 enum class EngineKind { kMemory, kLmdb, kMemoryEvicting, kLmdbEvicting };
 constexpr bool IsLmdb(EngineKind kind) { return kind == EngineKind::kLmdb || kind == EngineKind::kLmdbEvicting; }
 constexpr bool Evicts(EngineKind kind) { return kind == EngineKind::kMemoryEvicting || kind == EngineKind::kLmdbEvicting; }

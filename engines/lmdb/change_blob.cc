@@ -1,0 +1,81 @@
+#include "engines/lmdb/change_blob.h"
+
+#define XXH_INLINE_ALL
+#include <xxhash.h>
+
+#include <limits>
+
+#include "platform/error.h"
+#include "platform/variable_length.h"
+#include "vxUtils/BoundedReader.h"
+
+namespace vemo {
+
+namespace {
+
+constexpr std::size_t kChecksumBytes = 8;
+
+void AppendNumber(Bytes& bytes, std::uint64_t number) {
+  std::uint8_t form[kMaxVariableLengthUint64Bytes];
+  bytes.insert(bytes.end(), form, SerialiseVariableLengthUint64(form, number));
+}
+
+std::uint64_t Checksum(ByteView bytes, std::uint64_t commit) noexcept {
+  return XXH3_64bits_withSeed(bytes.data(), bytes.size(), commit);
+}
+
+}  // namespace
+
+void ChangeBlobBuilder::Add(OID oid, ByteView delta) {
+  AppendNumber(m_index, oid.m_value - m_lastOid.m_value);
+  AppendNumber(m_index, delta.size());
+  m_deltas.insert(m_deltas.end(), delta.begin(), delta.end());
+  m_lastOid = oid;
+  ++m_count;
+}
+
+Bytes ChangeBlobBuilder::Finish(std::uint64_t commit, std::uint64_t previous) const {
+  Bytes blob;
+  blob.reserve(2 * kMaxVariableLengthUint64Bytes + m_index.size() + m_deltas.size() + kChecksumBytes);
+  AppendNumber(blob, previous);
+  AppendNumber(blob, m_count);
+  blob.insert(blob.end(), m_index.begin(), m_index.end());
+  blob.insert(blob.end(), m_deltas.begin(), m_deltas.end());
+  const std::uint64_t checksum = Checksum(blob, commit);
+  for (std::size_t i = 0; i < kChecksumBytes; ++i) blob.push_back(static_cast<std::uint8_t>(checksum >> (8 * i)));
+  return blob;
+}
+
+ChangeBlob ParseChangeBlob(ByteView blob, std::uint64_t commit) {
+  if (blob.size() < kChecksumBytes || blob.size() > std::numeric_limits<std::uint32_t>::max()) {
+    throw MalformedBytes(0, "the changes of a commit cannot have " + std::to_string(blob.size()) + " bytes");
+  }
+  const ByteView content = blob.first(blob.size() - kChecksumBytes);
+  std::uint64_t stored = 0;
+  for (std::size_t i = kChecksumBytes; i-- > 0;) stored = stored << 8 | blob[content.size() + i];
+  if (stored != Checksum(content, commit)) throw MalformedBytes(content.size(), "the checksum of a commit's changes does not match");
+
+  BoundedReader reader(content);
+  ChangeBlob parsed;
+  parsed.previous = reader.ReadUint64();
+  const std::uint64_t count = reader.ReadUint64();
+  constexpr std::size_t kLeastBytesEach = 2;
+  if (count > reader.remaining() / kLeastBytesEach) reader.Fail("there are not so many changes");
+  parsed.changes.reserve(count);
+  std::uint64_t total = 0;
+  OID oid;
+  for (std::uint64_t i = 0; i < count; ++i) {
+    const std::uint64_t step = reader.ReadUint64();
+    if (step == 0 || step > std::numeric_limits<std::uint64_t>::max() - oid.m_value) reader.Fail("the ids do not ascend");
+    oid.m_value += step;
+    const std::uint64_t length = reader.ReadUint64();
+    if (length > content.size() - total) reader.Fail("a change goes beyond the end");
+    parsed.changes.push_back({oid, static_cast<std::uint32_t>(total), static_cast<std::uint32_t>(length)});
+    total += length;
+  }
+  if (total != reader.remaining()) reader.Fail("the changes do not fill the bytes");
+  for (ChangeBlob::Change& change : parsed.changes) change.offset += static_cast<std::uint32_t>(reader.offset());
+  return parsed;
+}
+
+}  // namespace vemo

@@ -1,0 +1,88 @@
+// Which commits hold changes of which records.
+//
+// A record of a commit is what stands in the table of records, or, where a later commit up to that one has a change of it, that
+// changed by the latest of these: a delta leads from the stored record to the whole new version, so that one suffices. Each stored
+// record says by which commit it was written, which tells the changes that it includes from those that it does not.
+//
+// The index knows the changes of every commit from the oldest that is kept up to the newest that a snapshot of this process has
+// seen, and for open snapshots also what newer commits have dropped. It is built from the blobs (change_blob.h) when a space is
+// opened, and follows whoever commits, this process or another.
+//
+// A commit whose blob is damaged is remembered as that: a record is in doubt where the blob might have a change of it.
+//
+// Any thread may call.
+#pragma once
+
+#include <cstdint>
+#include <deque>
+#include <optional>
+#include <set>
+#include <shared_mutex>
+#include <unordered_map>
+#include <vector>
+
+#include "engines/lmdb/change_blob.h"
+
+namespace vemo {
+
+class ChangeIndex {
+ public:
+  struct Version {
+    std::uint64_t commit;  // whose blob has the delta
+    std::uint32_t offset;  // of the delta in the blob
+    std::uint32_t length;
+  };
+  // What the kept changes add up to.
+  struct Load {
+    std::uint64_t bytes = 0;
+    std::uint64_t blobs = 0;
+    std::uint64_t records = 0;
+  };
+
+  // The commit of the newest blob taken in, 0 for none.
+  std::uint64_t Newest() const;
+  void Add(std::uint64_t commit, const ChangeBlob& blob, std::size_t bytes);
+  // The blob of that commit cannot be read.
+  void AddDamaged(std::uint64_t commit);
+  bool HasDamage() const;
+  std::vector<std::uint64_t> Damaged() const;
+
+  // The latest change of a record in commits up to `commit`.
+  std::optional<Version> Find(OID oid, std::uint64_t commit) const;
+  // Whether a change of later than `since` and up to `commit` may be lost.
+  bool IsInDoubt(std::uint64_t since, std::uint64_t commit) const;
+
+  // Snapshots of `commit` are open between these two.
+  void Open(std::uint64_t commit);
+  void Close(std::uint64_t commit) noexcept;
+
+  // Blobs before `first` are no longer kept in the state of `commit`, whose records include what they held: forgets them, except for
+  // what open snapshots of before may need.
+  void Drop(std::uint64_t first, std::uint64_t commit) noexcept;
+  // The highest such `first` so far: a snapshot of a state that keeps older blobs and was not open then cannot use the index.
+  std::uint64_t DroppedBefore() const;
+
+  // The ids of all records with changes, in ascending order.
+  std::vector<OID> Records() const;
+  // The commits of the blobs that are kept, in ascending order.
+  std::vector<std::uint64_t> Commits() const;
+  Load CurrentLoad() const;
+
+ private:
+  struct Blob {
+    std::uint64_t commit;
+    std::size_t bytes;
+  };
+
+  mutable std::shared_mutex m_mutex;
+  std::uint64_t m_newest = 0;
+  std::unordered_map<OID, std::vector<Version>> m_versions;  // ascending by commit
+  std::deque<Blob> m_blobs;                                  // ascending by commit
+  std::uint64_t m_bytes = 0;                                 // of m_blobs
+  std::uint64_t m_droppedBefore = 0;
+  std::uint64_t m_oldestAtDrop = 0;  // the oldest reader for whose sake Drop has kept something; 0 for none
+  std::set<std::uint64_t> m_damaged;
+  std::multiset<std::uint64_t> m_open;
+};
+
+}  // namespace vemo

@@ -1,0 +1,116 @@
+#include "engines/lmdb/record_writer.h"
+
+#include <algorithm>
+#include <cmath>
+#include <optional>
+#include <utility>
+
+#include "engines/lmdb/change_log.h"
+#include "engines/record_delta.h"
+
+namespace vemo {
+
+namespace {
+
+// A delta may be that long whatever the record's size: the record of a map changes with every entry that comes or goes.
+constexpr std::size_t kAlwaysShortBytes = 64;
+// The load, of which 1 is the bound, at which a round begins, and how much may come on top until it ends.
+constexpr double kRoundBegins = 0.5;
+constexpr double kRoundAdds = 0.4;
+
+}  // namespace
+
+RecordWriter::RecordWriter(SpaceWriter& writer, const ChangeIndex& index, const SettlingBounds& bounds, SettlingRound round)
+    : m_writer(writer),
+      m_index(index),
+      m_bounds(bounds),
+      m_round(std::move(round)),
+      m_commit(writer.Numbers().generation + 1),
+      m_before(writer.Changes()),
+      m_kept(m_before) {}
+
+void RecordWriter::Write(const CommitBatch& batch) {
+  if (m_index.HasDamage()) m_writer.FailChanges("the changes of a commit are damaged, so that nothing may be written");
+  for (const OID oid : batch.removedRecords) m_writer.RemoveRecord(oid);
+  // In the order of ids, so that neighbours are written while their page is at hand.
+  std::vector<const CommitBatch::Record*> sorted;
+  sorted.reserve(batch.records.size());
+  for (const CommitBatch::Record& record : batch.records) sorted.push_back(&record);
+  std::sort(sorted.begin(), sorted.end(), [](const auto* a, const auto* b) { return a->oid < b->oid; });
+  ChangeBlobBuilder changes;
+  for (const CommitBatch::Record* record : sorted) WriteRecord(*record, changes);
+  const std::size_t blobBytes = WriteChanges(changes);
+
+  std::vector<OID> touched(batch.removedRecords);
+  for (const CommitBatch::Record* record : sorted) touched.push_back(record->oid);
+  std::sort(touched.begin(), touched.end());
+  Settle(touched, blobBytes, changes.count());
+  if (m_kept.first != m_before.first) m_writer.PutFirstChanges(m_kept.first);
+  if (m_kept.last != m_before.last) m_writer.PutLastChanges(m_kept.last);
+}
+
+std::size_t RecordWriter::WriteChanges(const ChangeBlobBuilder& changes) {
+  if (changes.empty()) return 0;
+  const Bytes blob = changes.Finish(m_commit, m_kept.last);
+  m_writer.PutChanges(m_commit, blob);
+  m_kept.last = m_commit;
+  if (m_kept.first == 0) m_kept.first = m_commit;
+  return blob.size();
+}
+
+void RecordWriter::WriteRecord(const CommitBatch::Record& record, ChangeBlobBuilder& changes) {
+  if (const std::optional<StoredRecord> stored = m_writer.Stored(record.oid)) {
+    const std::size_t mostBytes = std::max(record.bytes.size() / 2, kAlwaysShortBytes);
+    if (const std::optional<Bytes> delta = RecordDelta(stored->record, record.bytes, mostBytes)) {
+      changes.Add(record.oid, *delta);
+      return;
+    }
+  }
+  m_writer.PutRecord(record.oid, m_commit, record.bytes);
+}
+
+double RecordWriter::LoadOf(const ChangeIndex::Load& load) const noexcept {
+  const auto part = [](std::uint64_t n, std::uint64_t of) { return static_cast<double>(n) / static_cast<double>(of); };
+  return std::max({part(load.bytes, m_bounds.bytes), part(load.blobs, m_bounds.commits), part(load.records, m_bounds.records)});
+}
+
+// A record that this commit touches is left alone: its new change leads from the record as it is stored.
+void RecordWriter::Settle(const std::vector<OID>& touched, std::size_t blobBytes, std::size_t numChanges) {
+  if (m_round.records == nullptr) {
+    if (LoadOf(m_index.CurrentLoad()) < kRoundBegins) return;
+    m_round = {std::make_shared<const std::vector<OID>>(m_index.Records()), 0, m_commit - 1};
+  }
+  const std::vector<OID>& records = *m_round.records;
+  const double growth = LoadOf({blobBytes, blobBytes > 0 ? 1u : 0u, numChanges});
+  const auto slice = static_cast<std::size_t>(std::ceil(static_cast<double>(records.size()) * growth / kRoundAdds));
+  const std::size_t end = std::min(records.size(), m_round.next + std::max<std::size_t>(slice, 1));
+  for (; m_round.next < end; ++m_round.next) {
+    const OID oid = records[m_round.next];
+    if (!std::binary_search(touched.begin(), touched.end(), oid)) SettleRecord(oid);
+  }
+  if (m_round.next == records.size()) DropBlobs();
+}
+
+// Nothing to do for a record that was removed, or written whole meanwhile.
+void RecordWriter::SettleRecord(OID oid) {
+  const std::optional<StoredRecord> stored = m_writer.Stored(oid);
+  const std::optional<ChangeIndex::Version> version = m_index.Find(oid, m_commit - 1);
+  if (!stored || !version || version->commit <= stored->commit) return;
+  Bytes changed;
+  m_writer.PutRecord(oid, m_commit, m_writer.CurrentRecord(oid, m_commit - 1, m_index, changed));
+}
+
+void RecordWriter::DropBlobs() {
+  m_kept.first = m_kept.last == m_commit ? m_commit : 0;
+  for (const std::uint64_t commit : m_index.Commits()) {
+    if (commit > m_round.begin) {
+      m_kept.first = commit;
+      break;
+    }
+    m_writer.RemoveChanges(commit);
+  }
+  if (m_kept.first == 0) m_kept.last = 0;
+  m_round = {};
+}
+
+}  // namespace vemo

@@ -1,0 +1,59 @@
+// How the records of a commit are written.
+//
+// A commit that changes a few entries of many nodes would rewrite as many pages. So of a record that is there already only what
+// changed is written, all changes of a commit together as one value (change_blob.h); what is pending is written into the records
+// a slice at a time by later commits, in the order of ids, where neighbours share pages. The slices are as large as keeps the
+// pending changes, and so the memory and the time that opening a space takes for them, within bounds. After a round through all
+// records that had changes when it began, the blobs of before are dropped.
+//
+// The idea of a log of small changes beside large sorted runs is that of O'Neil, Cheng, Gawlick and O'Neil, "The log-structured
+// merge-tree" (Acta Informatica 33, 1996).
+#pragma once
+
+#include <cstdint>
+#include <memory>
+#include <vector>
+
+#include "engines/lmdb/change_index.h"
+#include "engines/lmdb/lmdb_engine.h"
+#include "engines/lmdb/space_writer.h"
+
+namespace vemo {
+
+// A round of writing pending changes into records. It is not stored: whoever opens the space begins another.
+struct SettlingRound {
+  std::shared_ptr<const std::vector<OID>> records;  // null between rounds
+  std::size_t next = 0;                             // of these, the first that is not settled yet
+  std::uint64_t begin = 0;                          // the commit up to which changes are settled by the end
+};
+
+class RecordWriter {
+ public:
+  // Writes as the commit after the state that `writer` began with. `index` knows the changes up to there.
+  RecordWriter(SpaceWriter& writer, const ChangeIndex& index, const SettlingBounds& bounds, SettlingRound round);
+
+  // Throws DamagedStorage, before anything is written, where changes are damaged.
+  void Write(const CommitBatch& batch);
+
+  // The round as it stands once the commit is made.
+  const SettlingRound& round() const noexcept { return m_round; }
+
+ private:
+  void WriteRecord(const CommitBatch::Record& record, ChangeBlobBuilder& changes);
+  // Returns the number of bytes.
+  std::size_t WriteChanges(const ChangeBlobBuilder& changes);
+  void Settle(const std::vector<OID>& touched, std::size_t blobBytes, std::size_t numChanges);
+  void SettleRecord(OID oid);
+  void DropBlobs();
+  double LoadOf(const ChangeIndex::Load& load) const noexcept;
+
+  SpaceWriter& m_writer;
+  const ChangeIndex& m_index;
+  const SettlingBounds m_bounds;
+  SettlingRound m_round;
+  const std::uint64_t m_commit;
+  const ChangesRange m_before;
+  ChangesRange m_kept;
+};
+
+}  // namespace vemo
