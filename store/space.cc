@@ -33,6 +33,7 @@ std::unique_ptr<Engine> OpenEngine(const SpaceUri& uri, bool create) {
   options.create = create;
   options.mapBytes = uri.mapBytes;
   options.syncEachCommit = uri.syncEachCommit;
+  if (uri.pendingBytes != 0) options.pendingChanges.bytes = uri.pendingBytes;
   return OpenLmdbEngine(options);
 }
 

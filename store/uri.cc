@@ -16,16 +16,21 @@ void ApplyOption(std::string_view uri, std::string_view option, SpaceUri& parsed
   const std::size_t equals = option.find('=');
   const std::string_view key = option.substr(0, equals);
   const std::string_view value = equals == std::string_view::npos ? "" : option.substr(equals + 1);
-  if (key == "map_bytes") {
-    const auto result = std::from_chars(value.data(), value.data() + value.size(), parsed.mapBytes);
-    if (result.ec != std::errc() || result.ptr != value.data() + value.size() || parsed.mapBytes == 0) {
-      Refuse(uri, "map_bytes wants a number of bytes");
+  const auto readBytes = [&](std::uint64_t& bytes) {
+    const auto result = std::from_chars(value.data(), value.data() + value.size(), bytes);
+    if (result.ec != std::errc() || result.ptr != value.data() + value.size() || bytes == 0) {
+      Refuse(uri, std::string(key) + " wants a number of bytes");
     }
+  };
+  if (key == "map_bytes") {
+    readBytes(parsed.mapBytes);
+  } else if (key == "pending_bytes") {
+    readBytes(parsed.pendingBytes);
   } else if (key == "sync") {
     if (value != "commit" && value != "none_risking_loss") Refuse(uri, "sync is commit or none_risking_loss");
     parsed.syncEachCommit = value == "commit";
   } else {
-    Refuse(uri, "it has no option \"" + std::string(key) + "\" (map_bytes and sync are known)");
+    Refuse(uri, "it has no option \"" + std::string(key) + "\" (map_bytes, pending_bytes and sync are known)");
   }
 }
 
@@ -55,6 +60,7 @@ std::string SpaceUriText(const SpaceUri& uri) {
   if (uri.engine == SpaceUri::Engine::kMemory) return "memory:";
   std::string text = "lmdb:" + uri.path.string() + "?sync=" + (uri.syncEachCommit ? "commit" : "none_risking_loss");
   if (uri.mapBytes != 0) text += "&map_bytes=" + std::to_string(uri.mapBytes);
+  if (uri.pendingBytes != 0) text += "&pending_bytes=" + std::to_string(uri.pendingBytes);
   return text;
 }
 

@@ -14,6 +14,7 @@ void Stage::Open() {
     LmdbOptions options;
     options.path = m_folder->path() / "space";
     options.create = true;
+    options.pendingChanges = {.bytes = 4'096, .commits = 8, .records = 32};
     m_engine.reset();                // left by an attempt to open that failed
     m_engine = OpenLmdbEngine(options);
   } else if (m_engine == nullptr) {

@@ -81,7 +81,9 @@ class KillLoop {
   // Returns the last commit that was reported.
   std::uint64_t WorkAndKill() {
     const std::uint64_t seed = m_random();
-    ChildProcess child([&](const Conversation& parent) { return Work(m_uri, m_workload, seed, parent); });
+    // Half of the processes write changes into their records all the time, the others hardly ever.
+    const std::string uri = m_uri + (seed % 2 == 0 ? "?pending_bytes=8192" : "");
+    ChildProcess child([&](const Conversation& parent) { return Work(uri, m_workload, seed, parent); });
     std::uint64_t acknowledged = m_workload.model().commits;
     const auto hear = [&] {
       const std::string heard = child.Hear();

@@ -27,7 +27,7 @@ constexpr std::size_t kImagesPerChild = 64;
 constexpr std::size_t kImagesPerSecondLoss = 6;
 
 std::string UriOf(const std::filesystem::path& folder, bool sync) {
-  return "lmdb:" + folder.string() + (sync ? "" : "?sync=none_risking_loss");
+  return "lmdb:" + folder.string() + "?sync=" + (sync ? "commit" : "none_risking_loss");
 }
 
 // One folder to be judged, and how it came to be.
@@ -129,7 +129,9 @@ class PowerLoss {
   DiskTrace Record(std::uint64_t seed, std::uint64_t commits, const FolderImage& before) {
     const std::filesystem::path traceFile = m_folder.path() / "trace";
     std::filesystem::remove(traceFile);
-    const std::vector<std::string> arguments{VEMO_CAMPAIGN_PROGRAM, "record", UriOf(Space(), m_options.sync), std::to_string(seed),
+    // Half of the processes write changes into their records all the time, the others hardly ever.
+    const std::string uri = UriOf(Space(), m_options.sync) + (seed % 2 == 0 ? "&pending_bytes=4096" : "");
+    const std::vector<std::string> arguments{VEMO_CAMPAIGN_PROGRAM, "record", uri, std::to_string(seed),
                                              std::to_string(m_options.keys), std::to_string(commits)};
     std::vector<std::string> environment{"VEMO_DISK_FOLDER=" + Space().string(), "VEMO_DISK_TRACE=" + traceFile.string(),
                                          std::string("LD_PRELOAD=") + VEMO_DISK_RECORDER,

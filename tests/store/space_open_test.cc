@@ -24,9 +24,10 @@ TEST(SpaceUri, NamesTheEngineAndItsOptions) {
   EXPECT_EQ(plain.path, "/some/where");
   EXPECT_EQ(plain.mapBytes, 0u);
   EXPECT_TRUE(plain.syncEachCommit);
-  const SpaceUri full = ParseSpaceUri("lmdb:here?map_bytes=1048576&sync=none_risking_loss");
+  const SpaceUri full = ParseSpaceUri("lmdb:here?map_bytes=1048576&pending_bytes=9&sync=none_risking_loss");
   EXPECT_EQ(full.path, "here");
   EXPECT_EQ(full.mapBytes, 1048576u);
+  EXPECT_EQ(full.pendingBytes, 9u);
   EXPECT_FALSE(full.syncEachCommit);
 }
 
@@ -42,15 +43,16 @@ TEST(SpaceUri, RefusesWhatItDoesNotKnowAndSaysWhat) {
   EXPECT_NE(RefusalOf("lmdb:/x?sync=commit&").find("no option \"\""), std::string::npos);
   EXPECT_NE(RefusalOf("lmdb:/x?sync=none").find("sync is"), std::string::npos);
   for (const char* bytes : {"", "0", "-1", "1k", "99999999999999999999999"}) {
-    EXPECT_NE(RefusalOf(std::string("lmdb:/x?map_bytes=") + bytes).find("number of bytes"), std::string::npos)
-        << bytes;
+    for (const std::string option : {"map_bytes", "pending_bytes"}) {
+      EXPECT_NE(RefusalOf("lmdb:/x?" + option + "=" + bytes).find(option + " wants a number of bytes"), std::string::npos) << bytes;
+    }
   }
 }
 
 TEST(SpaceUri, TextWithAllOptionsReadsBackAsTheSame) {
   EXPECT_EQ(SpaceUriText(ParseSpaceUri("memory:")), "memory:");
   EXPECT_EQ(SpaceUriText(ParseSpaceUri("lmdb:/x")), "lmdb:/x?sync=commit");
-  const std::string full = "lmdb:/x?sync=none_risking_loss&map_bytes=5";
+  const std::string full = "lmdb:/x?sync=none_risking_loss&map_bytes=5&pending_bytes=6";
   EXPECT_EQ(SpaceUriText(ParseSpaceUri(full)), full);
 }
 
