@@ -22,14 +22,14 @@ StoredRecord ReadStoredRecord(const TreeCursor& cursor);
 // The changes of `commit`. Throws DamagedStorage where they are not there.
 ByteView ReadChanges(PageReader& reader, const SpaceState& state, std::uint64_t commit);
 
-// Takes in the changes of all commits up to `commit`, that of `state`, which the index does not know yet, and forgets those that it no longer
-// keeps. What cannot be read is remembered as damaged. False when the index has forgotten what `state` still needs: it is an older
-// state, and its reader was not entered in the index in time.
+// Takes in the changes, which the index does not know yet, of all commits up to `commit`, that of `state`, and forgets those that it
+// no longer keeps. What cannot be read is remembered as damaged. False when the index has forgotten what `state` still needs: it is
+// an older state, and its reader was not entered in the index in time.
 bool FollowChanges(ChangeIndex& index, PageReader& reader, const SpaceState& state, std::uint64_t commit);
 
-// The record of the entry that `cursor`, a position in the table of records of `state`, is at, as it is after `commit`, which is the
-// commit of `state`: whole, or with its change applied, and then the bytes lie in `changed`. Throws DamagedStorage where the changes
-// that it needs are damaged.
+// The record of the entry that `cursor`, a position in the table of records of `state`, is at, as it is after `commit`, that of
+// `state`: as it is stored, or with its change applied, and then the bytes lie in `changed`. Throws DamagedStorage where the
+// changes that it needs are damaged.
 ByteView ReadRecord(OID oid, std::uint64_t commit, const TreeCursor& cursor, const ChangeIndex& index, PageReader& reader,
                     const SpaceState& state, Bytes& changed);
 
