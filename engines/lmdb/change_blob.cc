@@ -36,26 +36,19 @@ void ChangeBlobBuilder::Add(OID oid, ByteView delta) {
 
 Bytes ChangeBlobBuilder::Finish(std::uint64_t commit, std::uint64_t previous) const {
   Bytes blob;
-  blob.reserve(2 * kMaxVariableLengthUint64Bytes + m_index.size() + m_deltas.size() + kChecksumBytes);
+  blob.reserve(2 * kMaxVariableLengthUint64Bytes + m_index.size() + kChecksumBytes + m_deltas.size());
   AppendNumber(blob, previous);
   AppendNumber(blob, m_count);
   blob.insert(blob.end(), m_index.begin(), m_index.end());
-  blob.insert(blob.end(), m_deltas.begin(), m_deltas.end());
   const std::uint64_t checksum = Checksum(blob, commit);
   for (std::size_t i = 0; i < kChecksumBytes; ++i) blob.push_back(static_cast<std::uint8_t>(checksum >> (8 * i)));
+  blob.insert(blob.end(), m_deltas.begin(), m_deltas.end());
   return blob;
 }
 
 ChangeBlob ParseChangeBlob(ByteView blob, std::uint64_t commit) {
-  if (blob.size() < kChecksumBytes || blob.size() > std::numeric_limits<std::uint32_t>::max()) {
-    throw MalformedBytes(0, "the changes of a commit cannot have " + std::to_string(blob.size()) + " bytes");
-  }
-  const ByteView content = blob.first(blob.size() - kChecksumBytes);
-  std::uint64_t stored = 0;
-  for (std::size_t i = kChecksumBytes; i-- > 0;) stored = stored << 8 | blob[content.size() + i];
-  if (stored != Checksum(content, commit)) throw MalformedBytes(content.size(), "the checksum of a commit's changes does not match");
-
-  BoundedReader reader(content);
+  BoundedReader reader(blob);
+  if (blob.size() > std::numeric_limits<std::uint32_t>::max()) reader.Fail("the changes of a commit have too many bytes");
   ChangeBlob parsed;
   parsed.previous = reader.ReadUint64();
   const std::uint64_t count = reader.ReadUint64();
@@ -69,10 +62,15 @@ ChangeBlob ParseChangeBlob(ByteView blob, std::uint64_t commit) {
     if (step == 0 || step > std::numeric_limits<std::uint64_t>::max() - oid.m_value) reader.Fail("the ids do not ascend");
     oid.m_value += step;
     const std::uint64_t length = reader.ReadUint64();
-    if (length > content.size() - total) reader.Fail("a change goes beyond the end");
+    if (length > blob.size() - total) reader.Fail("a change goes beyond the end");
     parsed.changes.push_back({oid, static_cast<std::uint32_t>(total), static_cast<std::uint32_t>(length)});
     total += length;
   }
+  const std::size_t checked = reader.offset();
+  reader.Skip(kChecksumBytes);
+  std::uint64_t stored = 0;
+  for (std::size_t i = kChecksumBytes; i-- > 0;) stored = stored << 8 | blob[checked + i];
+  if (stored != Checksum(blob.first(checked), commit)) reader.Fail("the checksum of a commit's changes does not match");
   if (total != reader.remaining()) reader.Fail("the changes do not fill the bytes");
   for (ChangeBlob::Change& change : parsed.changes) change.offset += static_cast<std::uint32_t>(reader.offset());
   return parsed;

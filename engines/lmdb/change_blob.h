@@ -3,8 +3,11 @@
 //   previous (variable-length)   the commit of the blob before this one, 0 for none
 //   count    (variable-length)
 //   count times: the id less the one before it (ids ascend), the length of its delta (both variable-length)
-//   the deltas (engines/record_delta.h), in the same order
 //   XXH3-64 of all before, seeded with the number of the commit (8 bytes, little-endian)
+//   the deltas (engines/record_delta.h), in the same order
+//
+// Who opens a space reads what stands before the deltas, which is some tenth of it. A damaged delta makes another record than
+// was committed, which the record's own seal tells.
 #pragma once
 
 #include <cstdint>
@@ -26,7 +29,7 @@ class ChangeBlobBuilder {
  private:
   std::size_t m_count = 0;
   OID m_lastOid;
-  Bytes m_index;
+  Bytes m_index;  // of the deltas
   Bytes m_deltas;
 };
 
@@ -40,7 +43,7 @@ struct ChangeBlob {
   std::vector<Change> changes;
 };
 
-// Throws MalformedBytes where the checksum or the form does not fit.
+// Throws MalformedBytes where the checksum or the form does not fit. Does not read the deltas.
 ChangeBlob ParseChangeBlob(ByteView blob, std::uint64_t commit);
 
 }  // namespace vemo

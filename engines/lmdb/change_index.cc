@@ -10,13 +10,36 @@ std::uint64_t ChangeIndex::Newest() const {
   return m_newest;
 }
 
+// A change before the next one of its record is what snapshots of commits in between find.
+bool ChangeIndex::IsNeeded(const Version& version, std::uint64_t nextCommit) const noexcept {
+  const auto reader = m_open.lower_bound(version.commit);
+  return reader != m_open.end() && *reader < nextCommit;
+}
+
+void ChangeIndex::DropUnneeded(Versions& versions) const noexcept {
+  std::uint64_t next = versions.newest.commit;
+  auto kept = versions.older.end();
+  for (auto version = versions.older.end(); version != versions.older.begin();) {
+    --version;
+    const std::uint64_t commit = version->commit;
+    if (IsNeeded(*version, next)) *--kept = *version;
+    next = commit;
+  }
+  versions.older.erase(versions.older.begin(), kept);
+}
+
 void ChangeIndex::Add(std::uint64_t commit, const ChangeBlob& blob, std::size_t bytes) {
   const std::unique_lock lock(m_mutex);
   if (commit <= m_newest) return;  // another thread was faster
   for (const ChangeBlob::Change& change : blob.changes) {
-    std::vector<Version>& versions = m_versions[change.oid];
+    const Version version{commit, change.offset, change.length};
+    const auto [entry, isNew] = m_versions.try_emplace(change.oid, Versions{version, {}});
+    Versions& versions = entry->second;
     // A call that ran out of memory half-way is made again.
-    if (versions.empty() || versions.back().commit < commit) versions.push_back({commit, change.offset, change.length});
+    if (isNew || versions.newest.commit == commit) continue;
+    versions.older.push_back(versions.newest);
+    versions.newest = version;
+    DropUnneeded(versions);
   }
   m_blobs.push_back({commit, bytes});
   m_bytes += bytes;
@@ -49,16 +72,19 @@ std::optional<ChangeIndex::Version> ChangeIndex::Find(OID oid, std::uint64_t com
   const std::shared_lock lock(m_mutex);
   const auto found = m_versions.find(oid);
   if (found == m_versions.end()) return std::nullopt;
-  const std::vector<Version>& versions = found->second;
-  const auto later = std::upper_bound(versions.begin(), versions.end(), commit,
+  const auto& [newest, older] = found->second;
+  if (newest.commit <= commit) return newest;
+  const auto later = std::upper_bound(older.begin(), older.end(), commit,
                                       [](std::uint64_t c, const Version& version) { return c < version.commit; });
-  if (later == versions.begin()) return std::nullopt;
+  if (later == older.begin()) return std::nullopt;
   return *std::prev(later);
 }
 
-void ChangeIndex::Open(std::uint64_t commit) {
+bool ChangeIndex::Open(std::uint64_t commit) {
   const std::unique_lock lock(m_mutex);
+  if (commit < m_newest && !m_open.contains(commit)) return false;
   m_open.insert(commit);
+  return true;
 }
 
 void ChangeIndex::Close(std::uint64_t commit) noexcept {
@@ -66,8 +92,7 @@ void ChangeIndex::Close(std::uint64_t commit) noexcept {
   m_open.erase(m_open.find(commit));
 }
 
-// Of the versions of a record, a reader finds the latest one up to its commit. So what is before the one that the oldest reader
-// finds is of no use to anybody; and where no reader is older than `commit`, neither is what is before `first`.
+// Where no reader is older than `commit`, nobody needs what is before `first`.
 void ChangeIndex::Drop(std::uint64_t first, std::uint64_t commit) noexcept {
   const std::unique_lock lock(m_mutex);
   const std::uint64_t oldestReader = m_open.empty() ? commit : *m_open.begin();
@@ -77,15 +102,10 @@ void ChangeIndex::Drop(std::uint64_t first, std::uint64_t commit) noexcept {
   m_oldestAtDrop = oldestReader < commit ? oldestReader : 0;
   for (; !m_blobs.empty() && m_blobs.front().commit < first; m_blobs.pop_front()) m_bytes -= m_blobs.front().bytes;
   for (auto entry = m_versions.begin(); entry != m_versions.end();) {
-    std::vector<Version>& versions = entry->second;
-    auto kept = std::upper_bound(versions.begin(), versions.end(), oldestReader,
-                                 [](std::uint64_t c, const Version& version) { return c < version.commit; });
-    if (kept != versions.begin()) --kept;
-    if (oldestReader >= commit) {
-      while (kept != versions.end() && kept->commit < first) ++kept;
-    }
-    versions.erase(versions.begin(), kept);
-    entry = versions.empty() ? m_versions.erase(entry) : std::next(entry);
+    Versions& versions = entry->second;
+    DropUnneeded(versions);
+    const bool isGone = oldestReader >= commit && versions.newest.commit < first;
+    entry = isGone ? m_versions.erase(entry) : std::next(entry);
   }
 }
 

@@ -4,8 +4,8 @@
 // changed by the latest of these: a delta leads from the stored record to the whole new version, so that one suffices. Each stored
 // record says by which commit it was written, which tells the changes that it includes from those that it does not.
 //
-// The index knows the changes of every commit from the oldest that is kept up to the newest that a snapshot of this process has
-// seen, and for open snapshots also what newer commits have dropped. It is built from the blobs (change_blob.h) when a space is
+// The index knows of each record the latest change, and those before it which an open snapshot of this process needs, up to the
+// newest commit that one has seen. It is built from the blobs (change_blob.h) when a space is
 // opened, and follows whoever commits, this process or another.
 //
 // A commit whose blob is damaged is remembered as that: a record is in doubt where the blob might have a change of it.
@@ -52,12 +52,13 @@ class ChangeIndex {
   // Whether a change of later than `since` and up to `commit` may be lost.
   bool IsInDoubt(std::uint64_t since, std::uint64_t commit) const;
 
-  // Snapshots of `commit` are open between these two.
-  void Open(std::uint64_t commit);
+  // A snapshot of `commit` is open between these two. False, and it is not: the index may have forgotten what such a snapshot needs,
+  // since a newer commit was taken in while none was open.
+  bool Open(std::uint64_t commit);
   void Close(std::uint64_t commit) noexcept;
 
-  // Blobs before `first` are no longer kept in the state of `commit`, whose records include what they held: forgets them, except for
-  // what open snapshots of before may need.
+  // Blobs before `first` are no longer kept in the state of `commit`, whose records include what they held: forgets them, except
+  // for what open snapshots of before may need.
   void Drop(std::uint64_t first, std::uint64_t commit) noexcept;
   // The highest such `first` so far: a snapshot of a state that keeps older blobs and was not open then cannot use the index.
   std::uint64_t DroppedBefore() const;
@@ -69,16 +70,23 @@ class ChangeIndex {
   Load CurrentLoad() const;
 
  private:
+  struct Versions {
+    Version newest;
+    std::vector<Version> older;  // ascending by commit
+  };
   struct Blob {
     std::uint64_t commit;
     std::size_t bytes;
   };
 
+  bool IsNeeded(const Version& version, std::uint64_t nextCommit) const noexcept;
+  void DropUnneeded(Versions& versions) const noexcept;
+
   mutable std::shared_mutex m_mutex;
   std::uint64_t m_newest = 0;
-  std::unordered_map<OID, std::vector<Version>> m_versions;  // ascending by commit
-  std::deque<Blob> m_blobs;                                  // ascending by commit
-  std::uint64_t m_bytes = 0;                                 // of m_blobs
+  std::unordered_map<OID, Versions> m_versions;
+  std::deque<Blob> m_blobs;   // ascending by commit
+  std::uint64_t m_bytes = 0;  // of m_blobs
   std::uint64_t m_droppedBefore = 0;
   std::uint64_t m_oldestAtDrop = 0;  // the oldest reader for whose sake Drop has kept something; 0 for none
   std::set<std::uint64_t> m_damaged;

@@ -30,7 +30,7 @@ LmdbSnapshot::LmdbSnapshot(std::shared_ptr<LmdbEnvironment> environment)
       m_records(m_reader, Table(kRecordsTable)),
       m_generation(ReadGeneration(m_reader, State())),
       m_changes(m_environment->changes(), m_generation),
-      m_isCurrent(FollowChanges(m_changes.Index(), m_reader, State(), m_generation)) {}
+      m_isCurrent(m_changes.IsOpen() && FollowChanges(m_changes.Index(), m_reader, State(), m_generation)) {}
 
 std::optional<ByteView> LmdbSnapshot::Read(OID oid) const {
   m_environment->RequireOwnProcess(kOperation);

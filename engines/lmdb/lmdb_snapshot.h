@@ -27,21 +27,25 @@ class OpenReading {
   const LmdbEnvironment::Reading m_reading;
 };
 
-// Keeps the changes that a snapshot of `commit` needs in the index while this object lives.
+// Keeps the changes that a snapshot of `commit` needs in the index while this object lives; IsOpen is false where they may have
+// been forgotten already.
 class OpenChanges {
  public:
-  OpenChanges(std::shared_ptr<ChangeIndex> index, std::uint64_t commit) : m_index(std::move(index)), m_commit(commit) {
-    m_index->Open(m_commit);
+  OpenChanges(std::shared_ptr<ChangeIndex> index, std::uint64_t commit)
+      : m_index(std::move(index)), m_commit(commit), m_isOpen(m_index->Open(m_commit)) {}
+  ~OpenChanges() {
+    if (m_isOpen) m_index->Close(m_commit);
   }
-  ~OpenChanges() { m_index->Close(m_commit); }
   OpenChanges(const OpenChanges&) = delete;
   OpenChanges& operator=(const OpenChanges&) = delete;
 
+  bool IsOpen() const noexcept { return m_isOpen; }
   ChangeIndex& Index() const noexcept { return *m_index; }
 
  private:
   const std::shared_ptr<ChangeIndex> m_index;
   const std::uint64_t m_commit;
+  const bool m_isOpen;
 };
 
 // Reads without LMDB (page_reader.h), whose transaction keeps the pages. Views point into the map of data.mdb, which

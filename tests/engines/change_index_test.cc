@@ -42,12 +42,15 @@ TEST(ChangeBlob, GivesBackIdsAndDeltas) {
   EXPECT_EQ(delta(2), DeltaOf(9, 200));
 }
 
-TEST(ChangeBlob, EveryFlippedBitAndEveryOtherLengthIsRefused) {
+// The deltas are under the seals of the records that they make.
+TEST(ChangeBlob, EveryFlippedBitBeforeTheDeltasAndEveryOtherLengthIsRefused) {
   ChangeBlobBuilder builder;
   builder.Add(OID(5), DeltaOf(1, 3));
   builder.Add(OID(900), DeltaOf(2, 2));
   const Bytes sound = builder.Finish(4, 2);
-  for (std::size_t bit = 0; bit < 8 * sound.size(); ++bit) {
+  const std::size_t deltas = ParseChangeBlob(sound, 4).changes.front().offset;
+  ASSERT_EQ(deltas, sound.size() - 5);
+  for (std::size_t bit = 0; bit < 8 * deltas; ++bit) {
     Bytes damaged = sound;
     damaged[bit / 8] ^= static_cast<std::uint8_t>(1u << bit % 8);
     EXPECT_THROW(ParseChangeBlob(damaged, 4), MalformedBytes) << bit;
@@ -66,6 +69,7 @@ TEST(ChangeBlob, OfAnotherCommitIsRefused) {
 TEST(ChangeIndex, FindsTheLatestChangeUpToACommit) {
   ChangeIndex index;
   index.Add(2, BlobOf({1, 4}, 2), 100);
+  ASSERT_TRUE(index.Open(4));
   index.Add(5, BlobOf({4, 6}, 5), 100);
   EXPECT_EQ(index.Newest(), 5u);
   EXPECT_EQ(Found(index, 1, 1), std::nullopt);
@@ -76,6 +80,32 @@ TEST(ChangeIndex, FindsTheLatestChangeUpToACommit) {
   EXPECT_EQ(Found(index, 6, 4), std::nullopt);
   EXPECT_EQ(Found(index, 7, 9), std::nullopt);
   EXPECT_EQ(index.Records(), (std::vector<OID>{OID(1), OID(4), OID(6)}));
+}
+
+TEST(ChangeIndex, ForgetsAChangeBehindANewerOneThatNoOpenSnapshotFinds) {
+  ChangeIndex index;
+  index.Add(2, BlobOf({4}, 2), 100);
+  ASSERT_TRUE(index.Open(2));
+  index.Add(3, BlobOf({4}, 3), 100);
+  index.Add(5, BlobOf({4}, 5), 100);
+  EXPECT_EQ(Found(index, 4, 2), 2u);
+  EXPECT_EQ(Found(index, 4, 4), 2u) << "there was no snapshot of commit 4";
+  EXPECT_EQ(Found(index, 4, 5), 5u);
+  index.Close(2);
+  index.Add(6, BlobOf({4}, 6), 100);
+  EXPECT_EQ(Found(index, 4, 5), std::nullopt);
+}
+
+TEST(ChangeIndex, ASnapshotThatComesTooLateForItsCommitIsNotOpened) {
+  ChangeIndex index;
+  index.Add(2, BlobOf({4}, 2), 100);
+  ASSERT_TRUE(index.Open(2));
+  index.Add(3, BlobOf({4}, 3), 100);
+  EXPECT_TRUE(index.Open(2)) << "another one keeps what it needs";
+  index.Close(2);
+  index.Close(2);
+  EXPECT_FALSE(index.Open(2));
+  EXPECT_TRUE(index.Open(3));
 }
 
 TEST(ChangeIndex, TakesABlobInOnce) {
@@ -91,7 +121,7 @@ TEST(ChangeIndex, ForgetsWhatIsDropped) {
   ChangeIndex index;
   index.Add(2, BlobOf({1, 4}, 2), 100);
   index.Add(5, BlobOf({4, 6}, 5), 100);
-  index.Open(5);
+  ASSERT_TRUE(index.Open(5));
   index.Drop(5, 5);
   EXPECT_EQ(index.DroppedBefore(), 5u);
   EXPECT_EQ(Found(index, 1, 9), std::nullopt);
@@ -133,9 +163,9 @@ TEST(ChangeIndex, KeepsForOpenSnapshotsWhatTheyWouldFind) {
   ChangeIndex index;
   index.Add(2, BlobOf({1, 4}, 2), 100);
   index.Add(3, BlobOf({4}, 3), 100);
+  ASSERT_TRUE(index.Open(3));
   index.Add(5, BlobOf({4, 6}, 5), 100);
-  index.Open(3);
-  index.Open(5);
+  ASSERT_TRUE(index.Open(5));
   index.Drop(8, 7);
   EXPECT_EQ(index.CurrentLoad().blobs, 0u);
   EXPECT_EQ(Found(index, 1, 3), 2u);
@@ -157,7 +187,7 @@ TEST(ChangeIndex, KeepsForASnapshotOfBetweenTheFirstKeptChangesAndTheDrop) {
   ChangeIndex index;
   index.Add(2, BlobOf({1}, 2), 100);
   index.Add(5, BlobOf({6}, 5), 100);
-  index.Open(6);
+  ASSERT_TRUE(index.Open(6));
   index.Drop(5, 7);
   EXPECT_EQ(Found(index, 1, 6), 2u);
   index.Close(6);
