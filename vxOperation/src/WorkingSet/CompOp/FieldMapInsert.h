@@ -103,13 +103,9 @@ typename Traits::LeafNode* TFieldMap<Traits>::wFindInLeaf(wFindRet& ret, LeafNod
   VEMO_ASSERT(left);
   const ssize_t nk = left->m_numKeyEntrys;
   VEMO_ASSERT_TEXT(0 <= nk && nk <= kCapacity, "0 <= nk && nk <= 100");
-  ssize_t lo = 0, hi = kCapacity;  // keys below lo are < key, slots from hi on have keys > key or none
-  while (lo < hi) {
+  ssize_t lo = 0, hi = nk - 1;  // keys below lo are < key, keys above hi are > key
+  while (lo <= hi) {
     const ssize_t mid = (lo + hi) / 2;
-    if (mid >= nk) {
-      hi = mid;
-      continue;
-    }
     VEMO_ASSERT(0 <= mid && mid < nk);
     const int c = CompareKeys(key, left->GetEntry(mid).first);
     if (c == 0) {
@@ -117,7 +113,7 @@ typename Traits::LeafNode* TFieldMap<Traits>::wFindInLeaf(wFindRet& ret, LeafNod
       return nullptr;
     }
     if (c < 0) {
-      hi = mid;
+      hi = mid - 1;
     } else {
       lo = mid + 1;
     }

@@ -1,8 +1,4 @@
 // Searching a field map: bodies of the functions that FieldMap.h and FieldMapNodes.h declare.
-//
-// Binary searches run over all slots of a node, those without an entry counting as behind every key. So the places of the
-// probes follow from the answers alone: a processor that guesses the answers can ask memory for several probes at once, and for
-// the number of entries beside them, where halving the entries would have to wait for that number first.
 #pragma once
 
 #include <limits>
@@ -17,14 +13,10 @@ ssize_t TFieldMapInternalNode<Traits>::FindChildIndexGivenKey(const FieldId& key
   const ssize_t nk = m_numKeyEntrys;
   VEMO_ASSERT_TEXT(1 <= nk && nk <= Traits::kCapacity, "1 <= nk && nk <= 100");
   if (CompareKeys(key, GetEntry(0).m_key) < 0) return -1;
-  // Entries below lo have keys <= key, slots from hi on have keys > key or none.
-  ssize_t lo = 1, hi = Traits::kCapacity;
+  // Entries below lo have keys <= key, entries from hi on have keys > key.
+  ssize_t lo = 1, hi = nk;
   while (lo < hi) {
     const ssize_t mid = (lo + hi) / 2;
-    if (mid >= nk) {
-      hi = mid;
-      continue;
-    }
     VEMO_ASSERT(1 <= mid && mid < nk);
     if (CompareKeys(key, GetEntry(mid).m_key) < 0) {
       hi = mid;
@@ -54,18 +46,14 @@ ssize_t TFieldMap<Traits>::SearchLeaf(const FieldId& key, const LeafNode* leaf) 
   VEMO_ASSERT(leaf);
   const ssize_t nk = leaf->m_numKeyEntrys;
   VEMO_ASSERT_TEXT(0 <= nk && nk <= kCapacity, "0 <= nk && nk <= 100");
-  ssize_t lo = 0, hi = kCapacity;  // the key is in [lo, hi) or nowhere
-  while (lo < hi) {
+  ssize_t lo = 0, hi = nk - 1;  // the key is in [lo, hi] or nowhere
+  while (lo <= hi) {
     const ssize_t mid = (lo + hi) / 2;
-    if (mid >= nk) {
-      hi = mid;
-      continue;
-    }
     const int c = CompareKeys(key, leaf->GetEntry(mid).first);
     if (c > 0) {
       lo = mid + 1;
     } else if (c < 0) {
-      hi = mid;
+      hi = mid - 1;
     } else {
       return mid;
     }
@@ -78,13 +66,9 @@ ssize_t TFieldMap<Traits>::LowerBoundInLeaf(const FieldId& key, const LeafNode* 
   VEMO_ASSERT(leaf);
   const ssize_t nk = leaf->m_numKeyEntrys;
   VEMO_ASSERT_TEXT(0 <= nk && nk <= kCapacity, "0 <= nk && nk <= 100");
-  ssize_t lo = 0, hi = kCapacity;  // keys below lo are < key, slots from hi on have keys >= key or none
+  ssize_t lo = 0, hi = nk;  // keys below lo are < key, keys from hi on are >= key
   while (lo < hi) {
     const ssize_t mid = (lo + hi) / 2;
-    if (mid >= nk) {
-      hi = mid;
-      continue;
-    }
     VEMO_ASSERT(0 <= mid && mid < nk);
     if (CompareKeys(key, leaf->GetEntry(mid).first) <= 0) {
       hi = mid;
@@ -102,13 +86,9 @@ ssize_t TFieldMap<Traits>::UpperBoundInLeaf(const FieldId& key, const LeafNode* 
   VEMO_ASSERT(leaf);
   const ssize_t nk = leaf->m_numKeyEntrys;
   VEMO_ASSERT_TEXT(0 <= nk && nk <= kCapacity, "0 <= nk && nk <= 100");
-  ssize_t lo = 0, hi = kCapacity;  // keys below lo are <= key, slots from hi on have keys > key or none
+  ssize_t lo = 0, hi = nk;  // keys below lo are <= key, keys from hi on are > key
   while (lo < hi) {
     const ssize_t mid = (lo + hi) / 2;
-    if (mid >= nk) {
-      hi = mid;
-      continue;
-    }
     VEMO_ASSERT(0 <= mid && mid < nk);
     if (CompareKeys(key, leaf->GetEntry(mid).first) < 0) {
       hi = mid;
