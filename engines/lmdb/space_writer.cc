@@ -96,7 +96,7 @@ void SpaceWriter::PutRecord(OID oid, std::uint64_t commit, ByteView record) {
   const std::uint64_t stamp = CommitStamp(tag, commit);
   std::memcpy(room, &commit, sizeof commit);
   std::memcpy(room + sizeof commit, &stamp, sizeof stamp);
-  std::memcpy(room + kCommitBytes, record.data(), record.size());
+  if (!record.empty()) std::memcpy(room + kCommitBytes, record.data(), record.size());
 }
 
 // Room for a value, to be filled at once.
