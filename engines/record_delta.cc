@@ -49,11 +49,15 @@ struct Gap {
   std::size_t added;
 };
 
-// How much of each side to skip until they agree again: all of both where they do not.
+// How much of each side to skip until they agree again: all of both where they do not. Looks first for what has kept its length,
+// as most of what is overwritten has.
 Gap FindGap(ByteView old, ByteView next) noexcept {
   if (old.size() >= kAnchorBytes && next.size() >= kAnchorBytes) {
     const std::size_t oldRange = std::min(kNearBytes, old.size() - kAnchorBytes);
     const std::size_t nextRange = std::min(kNearBytes, next.size() - kAnchorBytes);
+    for (std::size_t both = 1; both <= std::min(oldRange, nextRange); ++both) {
+      if (Anchor(old, both) == Anchor(next, both)) return {both, both};
+    }
     for (std::size_t sum = 1; sum <= oldRange + nextRange; ++sum) {
       for (std::size_t dropped = sum > nextRange ? sum - nextRange : 0; dropped <= std::min(sum, oldRange); ++dropped) {
         if (Anchor(old, dropped) == Anchor(next, sum - dropped)) return {dropped, sum - dropped};

@@ -9,11 +9,12 @@
 
 namespace vemo {
 
-// Commits write what changed of records; later ones write it into the records, so that no more is pending than this.
+// Commits write what changed of records; later ones write it into the records, so that no more is pending than this, nor much more
+// than a fifth of what the records take.
 struct SettlingBounds {
   std::uint64_t bytes = std::uint64_t{32} << 20;
   std::uint64_t commits = 4'096;
-  std::uint64_t records = 50'000;
+  std::uint64_t records = 200'000;
 };
 
 struct LmdbOptions {

@@ -17,13 +17,23 @@ constexpr std::size_t kAlwaysShortBytes = 64;
 // The load, of which 1 is the bound, at which a round begins, and how much may come on top until it ends.
 constexpr double kRoundBegins = 0.5;
 constexpr double kRoundAdds = 0.4;
+// The most that waits, as a part of what the records take, where that is less than the bound, and what may always wait.
+constexpr std::uint64_t kPartOfRecords = 5;
+constexpr std::uint64_t kAlwaysFewBytes = std::uint64_t{1} << 20;
+
+SettlingBounds BoundsFor(SettlingBounds bounds, const SpaceState& state) {
+  const TableRoot& records = state.Table(kRecordsTable)->root;
+  const std::uint64_t bytes = (records.leafPages + records.overflowPages) * state.pageBytes;
+  bounds.bytes = std::min(bounds.bytes, std::max(bytes / kPartOfRecords, kAlwaysFewBytes));
+  return bounds;
+}
 
 }  // namespace
 
 RecordWriter::RecordWriter(SpaceWriter& writer, const ChangeIndex& index, const SettlingBounds& bounds, SettlingRound round)
     : m_writer(writer),
       m_index(index),
-      m_bounds(bounds),
+      m_bounds(BoundsFor(bounds, writer.state())),
       m_round(std::move(round)),
       m_commit(writer.Numbers().generation + 1),
       m_before(writer.Changes()),
