@@ -108,8 +108,10 @@ Bytes ApplyRecordDelta(ByteView old, ByteView delta) {
   const auto append = [&](ByteView bytes) { next.insert(next.end(), bytes.begin(), bytes.end()); };
   while (reader.remaining() > 0) {
     append(take(old, reader.ReadUint64()));
-    take(old, reader.ReadUint64());
+    const std::uint64_t dropped = reader.ReadUint64();
+    take(old, dropped);
     const std::uint64_t added = reader.ReadUint64();
+    if (dropped == 0 && added == 0) reader.Fail("a step changes nothing");
     if (added > reader.remaining()) reader.Fail("a step adds more than there is");
     append(delta.subspan(reader.offset(), added));
     reader.Skip(added);

@@ -1,5 +1,7 @@
 #include "store/salvage_source.h"
 
+#include <utility>
+
 #include "store/tolerant_scan.h"
 
 namespace vemo {
@@ -82,7 +84,10 @@ std::optional<SoundRecord> SalvageSource::Read(OID oid, std::string* fault) cons
   const std::optional<ByteView> bytes = ReadOrFault(m_state, oid, why);
   if (!bytes) return std::nullopt;
   try {
-    return Open(oid, *bytes);
+    Bytes own(bytes->begin(), bytes->end());
+    SoundRecord record = Open(oid, own);
+    record.bytes = std::move(own);
+    return record;
   } catch (const RawFault& malformed) {
     why = malformed.what();
     return std::nullopt;
@@ -117,7 +122,7 @@ SoundRecord SalvageSource::Open(OID oid, ByteView bytes) const {
   const RawEnvelope envelope = OpenRawRecord(bytes, oid);
   const std::optional<RawClass> rawClass = m_classes.Find(envelope.classNumber);
   if (!rawClass) return OpenLeafOfUnknownClass(envelope);
-  return {*rawClass, envelope.commit, ReadRawBody(envelope.body, *rawClass)};
+  return {*rawClass, envelope.commit, ReadRawBody(envelope.body, *rawClass), {}};
 }
 
 // Where the table of classes is damaged: the payloads of the three maps differ, so a leaf is mostly of the one class as which it
@@ -127,7 +132,7 @@ SoundRecord SalvageSource::OpenLeafOfUnknownClass(const RawEnvelope& envelope) c
   for (const RawFamily family : {RawFamily::kInsertions, RawFamily::kTombstones, RawFamily::kInsertionsAndDeletions}) {
     try {
       const RawClass rawClass{family, RawKind::kLeaf};
-      readings.push_back({rawClass, envelope.commit, ReadRawBody(envelope.body, rawClass)});
+      readings.push_back({rawClass, envelope.commit, ReadRawBody(envelope.body, rawClass), {}});
     } catch (const RawFault&) {
       continue;
     }

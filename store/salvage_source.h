@@ -13,10 +13,12 @@
 namespace vemo {
 
 // A record that is sound by itself.
+// To be moved, not copied: `body` has views into `bytes`.
 struct SoundRecord {
   RawClass rawClass;
   std::uint64_t commit = 0;
   RawBody body;
+  Bytes bytes;  // of the record, since those that the engine shows end with its next answer
 };
 
 class SalvageSource {

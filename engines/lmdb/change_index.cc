@@ -1,9 +1,13 @@
 #include "engines/lmdb/change_index.h"
 
 #include <algorithm>
-#include <mutex>
 
 namespace vemo {
+
+void ChangeIndex::Follow(std::uint64_t commit) {
+  const std::unique_lock lock(m_mutex);
+  m_followed = std::max(m_followed, commit);
+}
 
 std::uint64_t ChangeIndex::Newest() const {
   const std::shared_lock lock(m_mutex);
@@ -30,13 +34,14 @@ void ChangeIndex::DropUnneeded(Versions& versions) const noexcept {
 
 void ChangeIndex::Add(std::uint64_t commit, const ChangeBlob& blob, std::size_t bytes) {
   const std::unique_lock lock(m_mutex);
-  if (commit <= m_newest) return;  // another thread was faster
+  if (commit <= m_newest || commit < m_droppedBefore) return;
   for (const ChangeBlob::Change& change : blob.changes) {
-    const Version version{commit, change.offset, change.length};
+    const Version version{commit, change.offset, change.length, change.check};
     const auto [entry, isNew] = m_versions.try_emplace(change.oid, Versions{version, {}});
     Versions& versions = entry->second;
     // A call that ran out of memory half-way is made again.
     if (isNew || versions.newest.commit == commit) continue;
+    if (versions.newest.commit < m_droppedBefore) --m_retained;
     versions.older.push_back(versions.newest);
     versions.newest = version;
     DropUnneeded(versions);
@@ -82,7 +87,7 @@ std::optional<ChangeIndex::Version> ChangeIndex::Find(OID oid, std::uint64_t com
 
 bool ChangeIndex::Open(std::uint64_t commit) {
   const std::unique_lock lock(m_mutex);
-  if (commit < m_newest && !m_open.contains(commit)) return false;
+  if (commit < m_followed && !m_open.contains(commit)) return false;
   m_open.insert(commit);
   return true;
 }
@@ -101,17 +106,16 @@ void ChangeIndex::Drop(std::uint64_t first, std::uint64_t commit) noexcept {
   m_droppedBefore = std::max(m_droppedBefore, first);
   m_oldestAtDrop = oldestReader < commit ? oldestReader : 0;
   for (; !m_blobs.empty() && m_blobs.front().commit < first; m_blobs.pop_front()) m_bytes -= m_blobs.front().bytes;
+  m_retained = 0;
   for (auto entry = m_versions.begin(); entry != m_versions.end();) {
     Versions& versions = entry->second;
     DropUnneeded(versions);
-    const bool isGone = oldestReader >= commit && versions.newest.commit < first;
+    const bool isSettled = versions.newest.commit < m_droppedBefore;
+    const bool isGone = oldestReader >= commit && isSettled;
+    if (isSettled && !isGone) ++m_retained;
     entry = isGone ? m_versions.erase(entry) : std::next(entry);
   }
-}
-
-std::uint64_t ChangeIndex::DroppedBefore() const {
-  const std::shared_lock lock(m_mutex);
-  return m_droppedBefore;
+  if (oldestReader >= commit) m_damaged.erase(m_damaged.begin(), m_damaged.lower_bound(m_droppedBefore));
 }
 
 std::vector<OID> ChangeIndex::Records() const {
@@ -119,7 +123,9 @@ std::vector<OID> ChangeIndex::Records() const {
   {
     const std::shared_lock lock(m_mutex);
     ids.reserve(m_versions.size());
-    for (const auto& [oid, versions] : m_versions) ids.push_back(oid);
+    for (const auto& [oid, versions] : m_versions) {
+      if (versions.newest.commit >= m_droppedBefore) ids.push_back(oid);
+    }
   }
   std::sort(ids.begin(), ids.end());
   return ids;
@@ -135,7 +141,7 @@ std::vector<std::uint64_t> ChangeIndex::Commits() const {
 
 ChangeIndex::Load ChangeIndex::CurrentLoad() const {
   const std::shared_lock lock(m_mutex);
-  return {m_bytes, m_blobs.size(), m_versions.size()};
+  return {m_bytes, m_blobs.size(), m_versions.size() - m_retained};
 }
 
 }  // namespace vemo

@@ -15,6 +15,7 @@
 
 #include <cstdint>
 #include <deque>
+#include <mutex>
 #include <optional>
 #include <set>
 #include <shared_mutex>
@@ -31,6 +32,7 @@ class ChangeIndex {
     std::uint64_t commit;  // whose blob has the delta
     std::uint32_t offset;  // of the delta in the blob
     std::uint32_t length;
+    std::uint32_t check;   // of the delta
   };
   // What the kept changes add up to.
   struct Load {
@@ -39,6 +41,11 @@ class ChangeIndex {
     std::uint64_t records = 0;
   };
 
+  // Held by who takes in what a state keeps (Follow, Add, AddDamaged, Drop, and Open before), so that nobody sees half of it.
+  std::mutex& following() noexcept { return m_following; }
+
+  // The state of `commit` is about to be taken in, if it is newer than all before.
+  void Follow(std::uint64_t commit);
   // The commit of the newest blob taken in, 0 for none.
   std::uint64_t Newest() const;
   void Add(std::uint64_t commit, const ChangeBlob& blob, std::size_t bytes);
@@ -53,17 +60,15 @@ class ChangeIndex {
   bool IsInDoubt(std::uint64_t since, std::uint64_t commit) const;
 
   // A snapshot of `commit` is open between these two. False, and it is not: the index may have forgotten what such a snapshot needs,
-  // since a newer commit was taken in while none was open.
+  // since a newer state was taken in while none was open.
   bool Open(std::uint64_t commit);
   void Close(std::uint64_t commit) noexcept;
 
   // Blobs before `first` are no longer kept in the state of `commit`, whose records include what they held: forgets them, except
   // for what open snapshots of before may need.
   void Drop(std::uint64_t first, std::uint64_t commit) noexcept;
-  // The highest such `first` so far: a snapshot of a state that keeps older blobs and was not open then cannot use the index.
-  std::uint64_t DroppedBefore() const;
 
-  // The ids of all records with changes, in ascending order.
+  // The ids of all records with changes in the blobs that are kept, in ascending order.
   std::vector<OID> Records() const;
   // The commits of the blobs that are kept, in ascending order.
   std::vector<std::uint64_t> Commits() const;
@@ -82,12 +87,15 @@ class ChangeIndex {
   bool IsNeeded(const Version& version, std::uint64_t nextCommit) const noexcept;
   void DropUnneeded(Versions& versions) const noexcept;
 
-  mutable std::shared_mutex m_mutex;
+  std::mutex m_following;
+  mutable std::shared_mutex m_mutex;  // guards what follows
+  std::uint64_t m_followed = 0;       // the newest state
   std::uint64_t m_newest = 0;
   std::unordered_map<OID, Versions> m_versions;
   std::deque<Blob> m_blobs;   // ascending by commit
   std::uint64_t m_bytes = 0;  // of m_blobs
   std::uint64_t m_droppedBefore = 0;
+  std::size_t m_retained = 0;  // records in m_versions for the sake of open snapshots alone
   std::uint64_t m_oldestAtDrop = 0;  // the oldest reader for whose sake Drop has kept something; 0 for none
   std::set<std::uint64_t> m_damaged;
   std::multiset<std::uint64_t> m_open;

@@ -1,6 +1,7 @@
 #include "engines/lmdb/change_log.h"
 
 #include <algorithm>
+#include <mutex>
 #include <string>
 
 #include "engines/lmdb/big_endian.h"
@@ -28,17 +29,42 @@ std::uint64_t TakeIn(ChangeIndex& index, TreeCursor& cursor, std::uint64_t from,
   for (bool found = cursor.Seek(KeyOf(from)); found; found = cursor.Next()) {
     const std::uint64_t commit = CommitOf(cursor);
     if (commit > last) break;
+    const auto damaged = [&] { index.AddDamaged(commit); };
     try {
       const ByteView bytes = cursor.Value();
       const ChangeBlob blob = ParseChangeBlob(bytes, commit);
       if (previous && blob.previous != *previous) index.AddDamaged(blob.previous);
       index.Add(commit, blob, bytes.size());
     } catch (const MalformedBytes&) {
-      index.AddDamaged(commit);
+      damaged();
+    } catch (const DamagedStorage&) {
+      damaged();
     }
     previous = commit;
   }
   return previous.value_or(0);
+}
+
+// Takes in what `state`, that of `commit`, keeps, with nobody else at it.
+void Follow(ChangeIndex& index, PageReader& reader, const SpaceState& state, std::uint64_t commit) {
+  const ChangesRange kept = ReadChangesRange(reader, state);
+  const std::uint64_t newest = index.Newest();
+  index.Follow(commit);
+  if (kept.last > newest) {
+    std::uint64_t last = 0;
+    try {
+      TreeCursor cursor(reader, *state.Table(kChangesTable));
+      // What is older than the first that is kept has been written into the records.
+      const bool followsNewest = newest >= kept.first;
+      if (!followsNewest && !cursor.Find(KeyOf(kept.first))) index.AddDamaged(kept.first);
+      last = TakeIn(index, cursor, std::max(newest + 1, kept.first), kept.last,
+                    followsNewest ? std::optional(newest) : std::nullopt);
+    } catch (const DamagedStorage&) {
+      // The blobs from there on are not known, and what the last one makes doubtful covers all that theirs would.
+    }
+    if (last != kept.last) index.AddDamaged(kept.last);
+  }
+  if (commit >= newest) index.Drop(kept.first != 0 ? kept.first : commit + 1, commit);
 }
 
 }  // namespace
@@ -61,24 +87,21 @@ ByteView ReadChanges(PageReader& reader, const SpaceState& state, std::uint64_t 
   reader.Fail(table.root.root, table, ("the changes of commit " + std::to_string(commit) + " are missing").c_str(), {});
 }
 
-bool FollowChanges(ChangeIndex& index, PageReader& reader, const SpaceState& state, std::uint64_t commit) {
-  const ChangesRange kept = ReadChangesRange(reader, state);
-  const std::uint64_t newest = index.Newest();
-  if (kept.last > newest) {
-    std::uint64_t last = 0;
-    try {
-      TreeCursor cursor(reader, *state.Table(kChangesTable));
-      // What is older than the first that is kept has been written into the records.
-      const bool followsNewest = newest >= kept.first;
-      last = TakeIn(index, cursor, std::max(newest + 1, kept.first), kept.last,
-                    followsNewest ? std::optional(newest) : std::nullopt);
-    } catch (const DamagedStorage&) {
-      // The blobs from there on are not known, and what the last one makes doubtful covers all that theirs would.
-    }
-    if (last != kept.last) index.AddDamaged(kept.last);
+void FollowChanges(ChangeIndex& index, PageReader& reader, const SpaceState& state, std::uint64_t commit) {
+  const std::lock_guard following(index.following());
+  Follow(index, reader, state, commit);
+}
+
+bool OpenChanges(ChangeIndex& index, PageReader& reader, const SpaceState& state, std::uint64_t commit) {
+  const std::lock_guard following(index.following());
+  if (!index.Open(commit)) return false;
+  try {
+    Follow(index, reader, state, commit);
+  } catch (...) {
+    index.Close(commit);
+    throw;
   }
-  if (commit >= newest) index.Drop(kept.first != 0 ? kept.first : commit + 1, commit);
-  return kept.first == 0 || index.DroppedBefore() <= kept.first;
+  return true;
 }
 
 ByteView ReadRecord(OID oid, std::uint64_t commit, const TreeCursor& cursor, const ChangeIndex& index, PageReader& reader,
@@ -90,12 +113,18 @@ ByteView ReadRecord(OID oid, std::uint64_t commit, const TreeCursor& cursor, con
     cursor.Fail("changes that may concern a record there are damaged");
   }
   if (!isChanged) return stored.record;
-  const ByteView blob = ReadChanges(reader, state, version->commit);
-  if (version->offset > blob.size() || version->length > blob.size() - version->offset) {
-    cursor.Fail("the changes of a record there are damaged");
-  }
+  constexpr const char* kDamaged = "the changes of a record there are damaged";
+  ByteView blob;
   try {
-    changed = ApplyRecordDelta(stored.record, blob.subspan(version->offset, version->length));
+    blob = ReadChanges(reader, state, version->commit);
+  } catch (const DamagedStorage&) {
+    cursor.Fail(kDamaged);
+  }
+  if (version->offset > blob.size() || version->length > blob.size() - version->offset) cursor.Fail(kDamaged);
+  const ByteView delta = blob.subspan(version->offset, version->length);
+  if (DeltaCheck(oid, version->commit, delta) != version->check) cursor.Fail(kDamaged);
+  try {
+    changed = ApplyRecordDelta(stored.record, delta);
   } catch (const MalformedBytes& malformed) {
     cursor.Fail((std::string("the changes of a record there do not fit it: ") + malformed.what()).c_str());
   }

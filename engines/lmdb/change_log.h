@@ -23,9 +23,12 @@ StoredRecord ReadStoredRecord(const TreeCursor& cursor);
 ByteView ReadChanges(PageReader& reader, const SpaceState& state, std::uint64_t commit);
 
 // Takes in the changes, which the index does not know yet, of all commits up to `commit`, that of `state`, and forgets those that it
-// no longer keeps. What cannot be read is remembered as damaged. False when the index has forgotten what `state` still needs: it is
-// an older state, and its reader was not entered in the index in time.
-bool FollowChanges(ChangeIndex& index, PageReader& reader, const SpaceState& state, std::uint64_t commit);
+// no longer keeps. What cannot be read is remembered as damaged.
+void FollowChanges(ChangeIndex& index, PageReader& reader, const SpaceState& state, std::uint64_t commit);
+
+// The same for a snapshot of `commit`, which is then open in the index. False, and it is not, when the index may have forgotten what
+// it needs: another thread has opened a newer one meanwhile.
+bool OpenChanges(ChangeIndex& index, PageReader& reader, const SpaceState& state, std::uint64_t commit);
 
 // The record of the entry that `cursor`, a position in the table of records of `state`, is at, as it is after `commit`, that of
 // `state`: as it is stored, or with its change applied, and then the bytes lie in `changed`. Throws DamagedStorage where the

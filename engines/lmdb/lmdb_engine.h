@@ -9,8 +9,8 @@
 
 namespace vemo {
 
-// Commits write what changed of records; later ones write it into the records, so that no more is pending than this, nor much more
-// than a fifth of what the records take.
+// Commits write what changed of records; later ones write it into the records, so that hardly more is pending than this, or than a
+// fifth of what the records take.
 struct SettlingBounds {
   std::uint64_t bytes = std::uint64_t{32} << 20;
   std::uint64_t commits = 4'096;

@@ -29,8 +29,7 @@ LmdbSnapshot::LmdbSnapshot(std::shared_ptr<LmdbEnvironment> environment)
       m_reader(MakeReader(m_reading.Known().file, State(), m_environment->name())),
       m_records(m_reader, Table(kRecordsTable)),
       m_generation(ReadGeneration(m_reader, State())),
-      m_changes(m_environment->changes(), m_generation),
-      m_isCurrent(m_changes.IsOpen() && FollowChanges(m_changes.Index(), m_reader, State(), m_generation)) {}
+      m_changes(m_environment->changes(), m_reader, State(), m_generation) {}
 
 std::optional<ByteView> LmdbSnapshot::Read(OID oid) const {
   m_environment->RequireOwnProcess(kOperation);
@@ -85,6 +84,7 @@ std::vector<StorageFinding> LmdbSnapshot::CheckStorage() const {
   std::vector<StorageFinding> findings =
       CheckPages(m_reading.Known().file, State(), m_environment->name()).findings;
   for (const std::uint64_t commit : m_changes.Index().Damaged()) {
+    if (commit > m_generation) break;
     findings.push_back({"the changes of commit " + std::to_string(commit) + " are damaged", std::nullopt});
   }
   if (findings.empty() && !m_reading.Known().doubt.empty()) findings.push_back({m_reading.Known().doubt, std::nullopt});

@@ -5,6 +5,8 @@
 #include <memory>
 #include <utility>
 
+#include "engines/fork_count.h"
+#include "engines/lmdb/change_log.h"
 #include "engines/lmdb/lmdb_environment.h"
 #include "engines/lmdb/tree_cursor.h"
 #include "store/engine.h"
@@ -27,17 +29,20 @@ class OpenReading {
   const LmdbEnvironment::Reading m_reading;
 };
 
-// Keeps the changes that a snapshot of `commit` needs in the index while this object lives; IsOpen is false where they may have
-// been forgotten already.
-class OpenChanges {
+// Keeps in the index, while this object lives, the changes that a snapshot of `state`, that of `commit`, needs; IsOpen is false where
+// they may have been forgotten already. A forked child leaves the index alone, which may have been copied while it was locked.
+class SnapshotChanges {
  public:
-  OpenChanges(std::shared_ptr<ChangeIndex> index, std::uint64_t commit)
-      : m_index(std::move(index)), m_commit(commit), m_isOpen(m_index->Open(m_commit)) {}
-  ~OpenChanges() {
-    if (m_isOpen) m_index->Close(m_commit);
+  SnapshotChanges(std::shared_ptr<ChangeIndex> index, PageReader& reader, const SpaceState& state, std::uint64_t commit)
+      : m_index(std::move(index)),
+        m_commit(commit),
+        m_forks(ForkCount()),
+        m_isOpen(OpenChanges(*m_index, reader, state, commit)) {}
+  ~SnapshotChanges() {
+    if (m_isOpen && m_forks == ForkCount()) m_index->Close(m_commit);
   }
-  OpenChanges(const OpenChanges&) = delete;
-  OpenChanges& operator=(const OpenChanges&) = delete;
+  SnapshotChanges(const SnapshotChanges&) = delete;
+  SnapshotChanges& operator=(const SnapshotChanges&) = delete;
 
   bool IsOpen() const noexcept { return m_isOpen; }
   ChangeIndex& Index() const noexcept { return *m_index; }
@@ -45,6 +50,7 @@ class OpenChanges {
  private:
   const std::shared_ptr<ChangeIndex> m_index;
   const std::uint64_t m_commit;
+  const std::uint64_t m_forks;
   const bool m_isOpen;
 };
 
@@ -55,7 +61,7 @@ class LmdbSnapshot final : public EngineSnapshot {
   explicit LmdbSnapshot(std::shared_ptr<LmdbEnvironment> environment);
 
   // Whether it can be read: false for one that was opened while the changes that it needs were forgotten. Open another.
-  bool IsCurrent() const noexcept { return m_isCurrent; }
+  bool IsCurrent() const noexcept { return m_changes.IsOpen(); }
 
   std::uint64_t Generation() const override { return m_generation; }
   std::optional<ByteView> Read(OID oid) const override;
@@ -79,8 +85,7 @@ class LmdbSnapshot final : public EngineSnapshot {
   mutable TreeCursor m_records;
   mutable Bytes m_changed;  // the record that Read has put together last
   const std::uint64_t m_generation;
-  const OpenChanges m_changes;
-  const bool m_isCurrent;
+  const SnapshotChanges m_changes;
 };
 
 }  // namespace vemo

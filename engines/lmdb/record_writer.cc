@@ -7,6 +7,7 @@
 
 #include "engines/lmdb/change_log.h"
 #include "engines/record_delta.h"
+#include "platform/error.h"
 
 namespace vemo {
 
@@ -24,7 +25,9 @@ constexpr std::uint64_t kAlwaysFewBytes = std::uint64_t{1} << 20;
 SettlingBounds BoundsFor(SettlingBounds bounds, const SpaceState& state) {
   const TableRoot& records = state.Table(kRecordsTable)->root;
   const std::uint64_t bytes = (records.leafPages + records.overflowPages) * state.pageBytes;
-  bounds.bytes = std::min(bounds.bytes, std::max(bytes / kPartOfRecords, kAlwaysFewBytes));
+  bounds.bytes = std::max<std::uint64_t>(1, std::min(bounds.bytes, std::max(bytes / kPartOfRecords, kAlwaysFewBytes)));
+  bounds.commits = std::max<std::uint64_t>(1, bounds.commits);
+  bounds.records = std::max<std::uint64_t>(1, bounds.records);
   return bounds;
 }
 
@@ -47,13 +50,16 @@ void RecordWriter::Write(const CommitBatch& batch) {
   sorted.reserve(batch.records.size());
   for (const CommitBatch::Record& record : batch.records) sorted.push_back(&record);
   std::sort(sorted.begin(), sorted.end(), [](const auto* a, const auto* b) { return a->oid < b->oid; });
-  ChangeBlobBuilder changes;
+  ChangeBlobBuilder changes(m_commit);
   for (const CommitBatch::Record* record : sorted) WriteRecord(*record, changes);
   const std::size_t blobBytes = WriteChanges(changes);
 
   std::vector<OID> touched(batch.removedRecords);
   for (const CommitBatch::Record* record : sorted) touched.push_back(record->oid);
   std::sort(touched.begin(), touched.end());
+  if (std::adjacent_find(touched.begin(), touched.end()) != touched.end()) {
+    throw UsageError("a commit has the record of an object twice, or has and removes it");
+  }
   Settle(touched, blobBytes, changes.count());
   if (m_kept.first != m_before.first) m_writer.PutFirstChanges(m_kept.first);
   if (m_kept.last != m_before.last) m_writer.PutLastChanges(m_kept.last);
@@ -61,7 +67,7 @@ void RecordWriter::Write(const CommitBatch& batch) {
 
 std::size_t RecordWriter::WriteChanges(const ChangeBlobBuilder& changes) {
   if (changes.empty()) return 0;
-  const Bytes blob = changes.Finish(m_commit, m_kept.last);
+  const Bytes blob = changes.Finish(m_kept.last);
   m_writer.PutChanges(m_commit, blob);
   m_kept.last = m_commit;
   if (m_kept.first == 0) m_kept.first = m_commit;
@@ -69,7 +75,8 @@ std::size_t RecordWriter::WriteChanges(const ChangeBlobBuilder& changes) {
 }
 
 void RecordWriter::WriteRecord(const CommitBatch::Record& record, ChangeBlobBuilder& changes) {
-  if (const std::optional<StoredRecord> stored = m_writer.Stored(record.oid)) {
+  const bool isTooMuch = changes.bytes() > m_bounds.bytes / 2 || changes.count() > m_bounds.records / 2;
+  if (const auto stored = isTooMuch ? std::nullopt : m_writer.Stored(record.oid)) {
     const std::size_t mostBytes = std::max(record.bytes.size() / 2, kAlwaysShortBytes);
     if (const std::optional<Bytes> delta = RecordDelta(stored->record, record.bytes, mostBytes)) {
       changes.Add(record.oid, *delta);
@@ -92,7 +99,10 @@ void RecordWriter::Settle(const std::vector<OID>& touched, std::size_t blobBytes
   }
   const std::vector<OID>& records = *m_round.records;
   const double growth = LoadOf({blobBytes, blobBytes > 0 ? 1u : 0u, numChanges});
-  const auto slice = static_cast<std::size_t>(std::ceil(static_cast<double>(records.size()) * growth / kRoundAdds));
+  // What writers that come and go have left of their rounds adds up, until one of them writes all of it.
+  const bool isLate = LoadOf(m_index.CurrentLoad()) >= kRoundBegins + kRoundAdds;
+  const double part = isLate ? 1 : std::min(1.0, growth / kRoundAdds);
+  const auto slice = static_cast<std::size_t>(std::ceil(static_cast<double>(records.size()) * part));
   const std::size_t end = std::min(records.size(), m_round.next + std::max<std::size_t>(slice, 1));
   for (; m_round.next < end; ++m_round.next) {
     const OID oid = records[m_round.next];

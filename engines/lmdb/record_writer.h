@@ -32,7 +32,7 @@ class RecordWriter {
   // Writes as the commit after the state that `writer` began with. `index` knows the changes up to there.
   RecordWriter(SpaceWriter& writer, const ChangeIndex& index, const SettlingBounds& bounds, SettlingRound round);
 
-  // Throws DamagedStorage, before anything is written, where changes are damaged.
+  // Throws DamagedStorage where changes are damaged, also of a record that is to be settled; then nothing may be committed.
   void Write(const CommitBatch& batch);
 
   // The round as it stands once the commit is made.

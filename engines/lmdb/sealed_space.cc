@@ -187,7 +187,7 @@ KnownStatePtr SealedSpace::RequireWritable(std::uint64_t transaction) {
     Throw("nothing can be written, since data could be lost by it: " + known->doubt +
           "; run vemo verify, and restore the space from a backup");
   }
-  // One that could not be written then. Where the write of the next meta page fails too, LMDB leaves roots of the failed commit under
+  // Its seal could not be written when it was committed. Where the write of the next meta page fails too, LMDB leaves roots of the failed commit under
   // the number of an older one, which only a seal tells from a damaged number.
   if (!seal) m_seal.Write({transaction, known->state->rootsDigest, known->state->freeDigest});
   return known;

@@ -215,6 +215,43 @@ TEST_F(PendingChanges, DamageMakesDoubtfulWhatItMayConcernAndNothingElse) {
   EXPECT_EQ(engine->OpenSnapshot()->Generation(), 3u);
 }
 
+// Each of them settles a slice from the beginning at first.
+TEST_F(PendingChanges, StayWithinTheirBoundsWhereEachCommitHasAnEngineOfItsOwn) {
+  std::map<std::uint64_t, std::string> records = MakeRecords(*Open(kFew), 10);
+  for (std::uint64_t commit = 1; commit < 60; ++commit) Open(kFew)->Commit(EditOfAll(records, commit).At(commit));
+  EXPECT_EQ(NewestContents(*Open(kFew)).records, AsList(records));
+  EXPECT_LE(CountStored("changes"), kFew.commits);
+}
+
+// Steps of zeros could leave the older version of the record, which nothing is wrong with.
+TEST_F(PendingChanges, ThatAreZeroedAreRefusedForTheirRecordAlone) {
+  std::map<std::uint64_t, std::string> records;
+  {
+    const auto engine = Open(kAny);
+    records = MakeRecords(*engine, 5);
+    engine->Commit(EditOfAll(records, 40).At(1));
+  }
+  constexpr std::size_t kDeltaBytes = 4;  // keep 40, drop 1, add 1, the byte
+  EachStored("changes", [&](std::string& blob) {
+    blob.replace(blob.size() - kDeltaBytes, kDeltaBytes, kDeltaBytes, '\0');
+    return true;
+  });
+  const auto engine = Open(kAny);
+  const auto snapshot = engine->OpenSnapshot();
+  for (const std::uint64_t sound : {1, 2, 3, 4}) EXPECT_EQ(ToText(snapshot->Read(OID(sound))), records[sound]) << sound;
+  EXPECT_THROW(snapshot->Read(OID(5)), DamagedStorage);
+}
+
+TEST_F(PendingChanges, AreNoneOfACommitThatChangesMoreThanMayWait) {
+  const auto engine = Open(kFew);
+  auto records = MakeRecords(*engine, 200);
+  engine->Commit(EditOfAll(records, 3).At(1));
+  EXPECT_EQ(NewestContents(*engine).records, AsList(records));
+  BatchBuilder twice;
+  twice.Put(1, "one").Put(1, "another");
+  EXPECT_THROW(engine->Commit(twice.At(2)), UsageError);
+}
+
 // Were it believed, the record would be taken for newer than its changes.
 TEST_F(PendingChanges, ARecordWhoseCommitIsDamagedIsRefused) {
   {

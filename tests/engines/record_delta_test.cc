@@ -126,5 +126,11 @@ TEST(RecordDelta, StepsBeyondTheOldVersionAreRefused) {
   EXPECT_EQ(ApplyRecordDelta(old, Bytes{1, 1, 1, 'x'}), ToBytes("oxd"));
 }
 
+TEST(RecordDelta, StepsThatChangeNothingAreRefused) {
+  const Bytes old(20, 1);
+  EXPECT_THROW(ApplyRecordDelta(old, Bytes{0, 0, 0}), MalformedBytes);
+  EXPECT_THROW(ApplyRecordDelta(old, Bytes{5, 0, 0}), MalformedBytes);
+}
+
 }  // namespace
 }  // namespace vemo
