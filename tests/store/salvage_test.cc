@@ -124,6 +124,27 @@ TEST_P(SalvageTest, ADestinationThatHoldsSomethingIsRefused) {
   EXPECT_THROW(Salvage(*site.engine().OpenSnapshot(), *meta), UsageError);
 }
 
+// An engine may put a changed record together for each read.
+TEST_P(SalvageTest, OfLeavesThatChangedSinceBehindADamagedNodeBringsWhatTheyHoldNow) {
+  Numbers expected = NumbersFrom(1, kKeys);
+  {
+    WriteTransaction transaction(space());
+    auto& map = transaction.Root<TombstonesMap>("t");
+    for (std::uint64_t n = 1; n <= kKeys; n += 10) {
+      expected[n] = n + 5;
+      map.Insert(Key(n), PayloadOf<TombstonesMap>(n + 5), true);
+    }
+    transaction.Commit();
+  }
+  m_stored = Stored();
+  Damage(m_inner[1]);
+  Damage(m_leaves[77]);  // below it: what is behind is reached from the right
+  Rescue();
+  for (std::uint64_t n = FirstKeyOf(77); n < FirstKeyOf(78); ++n) expected.erase(n);
+  EXPECT_EQ(Rescued<TombstonesMap>("t"), expected);
+  ExpectTheRestIsThere();
+}
+
 TEST_P(SalvageTest, OfADamagedLeafLosesItsEntriesAloneAndNamesTheirRange) {
   for (const std::size_t i : {std::size_t{0}, std::size_t{77}, m_leaves.size() - 1}) {
     Damage(m_leaves[i]);
