@@ -44,7 +44,7 @@ class Races {
   Verdict Run() {
     {
       ScratchFolder folder;
-      RunOn("lmdb:" + (folder.path() / "space").string());
+      RunOn("lmdb:" + (folder.path() / "space").string() + "?pending_bytes=8192");
     }
     RunOn("memory:");
     return m_verdict;
