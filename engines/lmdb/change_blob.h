@@ -7,7 +7,7 @@
 //   XXH3-64 of all before, seeded with the number of the commit (8 bytes, little-endian)
 //   the deltas (engines/record_delta.h), in the same order
 //
-// Who opens a space reads what stands before the deltas, which is some fifth of it. The check tells a damaged delta when it is
+// Who opens a space reads what stands before the deltas, and not these. The check tells a damaged delta when it is
 // applied: it might lead to an older version of the record, whose own seal is sound.
 #pragma once
 

@@ -242,14 +242,32 @@ TEST_F(PendingChanges, ThatAreZeroedAreRefusedForTheirRecordAlone) {
   EXPECT_THROW(snapshot->Read(OID(5)), DamagedStorage);
 }
 
-TEST_F(PendingChanges, AreNoneOfACommitThatChangesMoreThanMayWait) {
-  const auto engine = Open(kFew);
-  auto records = MakeRecords(*engine, 200);
-  engine->Commit(EditOfAll(records, 3).At(1));
-  EXPECT_EQ(NewestContents(*engine).records, AsList(records));
+TEST_F(PendingChanges, OfACommitThatChangesMoreThanMayWaitAreFew) {
+  {
+    const auto engine = Open(kFew);
+    auto records = MakeRecords(*engine, 200);
+    engine->Commit(EditOfAll(records, 3).At(1));
+    EXPECT_EQ(NewestContents(*engine).records, AsList(records));
+  }
+  constexpr std::size_t kBytesOfOneChange = 16;
+  std::size_t bytes = 0;
+  EachStored("changes", [&](const std::string& blob) {
+    bytes += blob.size();
+    return false;
+  });
+  EXPECT_GT(bytes, 0u);
+  EXPECT_LT(bytes, kFew.records * kBytesOfOneChange);
+}
+
+TEST_F(PendingChanges, ARecordThatIsThereTwiceInABatchIsRefused) {
+  const auto engine = Open(kAny);
   BatchBuilder twice;
   twice.Put(1, "one").Put(1, "another");
-  EXPECT_THROW(engine->Commit(twice.At(2)), UsageError);
+  EXPECT_THROW(engine->Commit(twice.At(0)), UsageError);
+  BatchBuilder both;
+  both.Put(1, "one").Remove(1);
+  EXPECT_THROW(engine->Commit(both.At(0)), UsageError);
+  EXPECT_EQ(engine->OpenSnapshot()->Generation(), 0u);
 }
 
 // Were it believed, the record would be taken for newer than its changes.
