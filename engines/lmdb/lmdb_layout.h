@@ -15,8 +15,8 @@
 //
 // A tag is the XXH3-64 of the key, seeded with the XXH3-64 of the table's name, 8 bytes LE: it tells a value that is
 // reached under a wrong key or in a wrong table. A checksum is the XXH3-64 of the bytes before it, seeded with the tag
-// that the key would have, and so is the stamp of a commit. One transaction makes all of it: an environment has no table at all, or is a whole space, or
-// is somebody else's.
+// that the key would have, and so is the stamp of a commit. One transaction makes all of it: an environment has no
+// table at all, or is a whole space, or is somebody else's.
 #pragma once
 
 #include <array>

@@ -27,7 +27,8 @@ class PendingChanges : public testing::Test {
   }
   std::filesystem::path space() const { return m_folder.path() / "space"; }
 
-  // Does `act` with each entry of a table, by LMDB.
+  // Does `act` with the value of each entry of a table, by LMDB; where it returns true, what it has made of it is stored, and an
+  // empty one is removed.
   template <typename Act>
   void EachStored(const char* table, const Act& act) {
     MDB_env* env = nullptr;
@@ -44,6 +45,10 @@ class PendingChanges : public testing::Test {
     while (mdb_cursor_get(cursor, &key, &value, MDB_NEXT) == 0) {
       std::string bytes(static_cast<char*>(value.mv_data), value.mv_size);
       if (!act(bytes)) continue;
+      if (bytes.empty()) {
+        ASSERT_EQ(mdb_cursor_del(cursor, 0), 0);
+        continue;
+      }
       value.mv_data = bytes.data();
       ASSERT_EQ(mdb_cursor_put(cursor, &key, &value, MDB_CURRENT), 0);
     }
@@ -217,29 +222,60 @@ TEST_F(PendingChanges, DamageMakesDoubtfulWhatItMayConcernAndNothingElse) {
 
 // Each of them settles a slice from the beginning at first.
 TEST_F(PendingChanges, StayWithinTheirBoundsWhereEachCommitHasAnEngineOfItsOwn) {
-  std::map<std::uint64_t, std::string> records = MakeRecords(*Open(kFew), 10);
-  for (std::uint64_t commit = 1; commit < 60; ++commit) Open(kFew)->Commit(EditOfAll(records, commit).At(commit));
-  EXPECT_EQ(NewestContents(*Open(kFew)).records, AsList(records));
-  EXPECT_LE(CountStored("changes"), kFew.commits);
+  SettlingBounds bounds = kAny;
+  bounds.commits = 32;  // a slice is one record of ten
+  std::map<std::uint64_t, std::string> records = MakeRecords(*Open(bounds), 10);
+  for (std::uint64_t commit = 1; commit < 80; ++commit) Open(bounds)->Commit(EditOfAll(records, commit).At(commit));
+  EXPECT_EQ(NewestContents(*Open(bounds)).records, AsList(records));
+  EXPECT_LE(CountStored("changes"), bounds.commits);
 }
 
-// Steps of zeros could leave the older version of the record, which nothing is wrong with.
-TEST_F(PendingChanges, ThatAreZeroedAreRefusedForTheirRecordAlone) {
+// An engine does not know the seals of records.
+TEST_F(PendingChanges, AChangeThatIsDamagedIsRefusedForItsRecordAlone) {
   std::map<std::uint64_t, std::string> records;
   {
     const auto engine = Open(kAny);
     records = MakeRecords(*engine, 5);
     engine->Commit(EditOfAll(records, 40).At(1));
   }
-  constexpr std::size_t kDeltaBytes = 4;  // keep 40, drop 1, add 1, the byte
   EachStored("changes", [&](std::string& blob) {
-    blob.replace(blob.size() - kDeltaBytes, kDeltaBytes, kDeltaBytes, '\0');
+    blob.back() ^= 1;  // the byte that the last record gets
     return true;
   });
   const auto engine = Open(kAny);
   const auto snapshot = engine->OpenSnapshot();
   for (const std::uint64_t sound : {1, 2, 3, 4}) EXPECT_EQ(ToText(snapshot->Read(OID(sound))), records[sound]) << sound;
   EXPECT_THROW(snapshot->Read(OID(5)), DamagedStorage);
+}
+
+TEST_F(PendingChanges, ThatAreMissingMakeDoubtfulWhatTheyMayConcern) {
+  for (const std::size_t missing : {0, 1, 2}) {
+    std::filesystem::remove_all(space());
+    std::map<std::uint64_t, std::string> records;
+    {
+      const auto engine = Open(kAny);
+      records = MakeRecords(*engine, 3);
+      for (std::uint64_t commit = 1; commit <= 3; ++commit) {
+        BatchBuilder batch;
+        ++records[commit][9];
+        batch.Put(commit, records[commit]);
+        engine->Commit(batch.At(commit));
+      }
+    }
+    std::size_t place = 0;
+    EachStored("changes", [&](std::string& blob) {
+      if (place++ != missing) return false;
+      blob.clear();
+      return true;
+    });
+    const auto engine = Open(kAny);
+    const auto snapshot = engine->OpenSnapshot();
+    EXPECT_THROW(snapshot->Read(OID(missing + 1)), DamagedStorage) << missing;
+    EXPECT_EQ(snapshot->CheckStorage().size(), 1u) << missing;
+    for (std::uint64_t later = missing + 2; later <= 3; ++later) {
+      EXPECT_EQ(ToText(snapshot->Read(OID(later))), records[later]) << missing;
+    }
+  }
 }
 
 TEST_F(PendingChanges, OfACommitThatChangesMoreThanMayWaitAreFew) {
