@@ -98,14 +98,12 @@ inline std::size_t VariableLengthBytes(std::uint8_t first) noexcept {
 
 // The value of the form of `length` bytes at `p`, where nine bytes can be read whatever its length: without a branch for each.
 inline std::uint64_t DeserialiseVariableLengthUint64FromNine(const std::uint8_t* p, std::size_t length) noexcept {
-  std::uint64_t behind;
-  std::memcpy(&behind, p + 1, sizeof(behind));
-  behind = __builtin_bswap64(behind);
-  if (length > sizeof(behind)) return behind;
-  const std::uint64_t top = *p & (0xFFu >> length);
-  const std::size_t following = length - 1;
-  // Shifted in two steps: a shift by all 64 bits, where nothing follows, is none.
-  return top << (8 * following) | behind >> 1 >> (63 - 8 * following);
+  std::uint64_t form;
+  std::memcpy(&form, length > sizeof(form) ? p + 1 : p, sizeof(form));
+  form = __builtin_bswap64(form);
+  if (length > sizeof(form)) return form;
+  // Behind as many leading bits as the form has bytes come 7 bits of the value for each.
+  return form << length >> (64 - 7 * length);
 }
 
 }  // namespace vemo

@@ -193,11 +193,14 @@ void TPtoQMap<T>::ReplaceRuns(ssize_t first, ssize_t count, const Interval& merg
 
 template <class T>
 void TPtoQMap<T>::Serialise(Archive& ar) const {
-  const auto n = static_cast<std::size_t>(m_tombstones.size());
+  // Asked for once: for all that the compiler knows, what is written could be the list itself.
+  const Interval* const first = begin();
+  const Interval* const last = end();
+  const auto n = static_cast<std::size_t>(last - first);
   T t = 0;
   if (std::uint8_t* p = ar.BeginWriteIfRoom((1 + 2 * n) * MAX_VARIABLE_LENGTH_UINT_SIZE)) {
     p = SerialiseVariableLengthInteger(p, n);
-    for (const Interval* i = begin(); i != end(); ++i) {
+    for (const Interval* i = first; i != last; ++i) {
       VEMO_ASSERT(t <= i->t1);
       p = SerialiseVariableLengthInteger(p, i->t1 - t);
       p = SerialiseVariableLengthInteger(p, i->size());
@@ -207,7 +210,7 @@ void TPtoQMap<T>::Serialise(Archive& ar) const {
     return;
   }
   SerialiseVariableLengthUint(ar, n);
-  for (const Interval* i = begin(); i != end(); ++i) {
+  for (const Interval* i = first; i != last; ++i) {
     VEMO_ASSERT(t <= i->t1);
     SerialiseVariableLengthUint(ar, i->t1 - t);
     SerialiseVariableLengthUint(ar, i->size());
@@ -218,22 +221,23 @@ void TPtoQMap<T>::Serialise(Archive& ar) const {
 template <class T>
 void TPtoQMap<T>::Deserialise(InputArchive& ar) {
   ssize_t n = 0;
-  DeserialiseVariableLengthUint(ar, n);
+  const std::uint8_t* p = DeserialiseVariableLengthInteger(ar.ptr(), n);
   VEMO_ASSERT(0 <= n);
   m_tombstones.clear();
   m_tombstones.ReserveMore(n);
-  const std::uint8_t* p = ar.ptr();
+  Interval* const runs = m_tombstones.AppendRaw(n);
   T position = 0;
-  for (; n > 0; --n) {
+  for (ssize_t i = 0; i < n; ++i) {
     T dt = 0;
     p = DeserialiseVariableLengthInteger(p, dt);
     VEMO_ASSERT(0 <= dt);
     T size = 0;
     p = DeserialiseVariableLengthInteger(p, size);
     VEMO_ASSERT(0 <= size);
-    const T t1 = position + dt;
-    position = t1 + size;
-    m_tombstones.safe_push_back({t1, position});
+    const Interval run{position + dt, position + dt + size};
+    AssertMayFollow(i == 0, position, run);
+    runs[i] = run;
+    position = run.t2;
   }
   ar.SetPtr(p);
 }

@@ -31,6 +31,14 @@ xostream& operator<<(xostream& os, const HalfOpenInterval<T>& interval) {
             << ')';
 }
 
+// Asserts that `h` is not empty and that, unless it is the first of a list, a position lies between it and the one before, which
+// ends at `endBefore`.
+template <class T>
+void AssertMayFollow(bool isFirst, T endBefore, const HalfOpenInterval<T>& h) {
+  VEMO_ASSERT(!h.empty());
+  VEMO_ASSERT_TEXT(isFirst || endBefore < h.t1, "(*this)[n-1].t2 < h.t1");
+}
+
 // Intervals in increasing order. What is built by safe_push_back alone holds no empty interval, and between
 // neighbours lies at least one position; the operations inherited from the vector do not look after that.
 template <class T>
@@ -39,9 +47,8 @@ class IntervalList : public xvector<HalfOpenInterval<T>> {
   // Appends an interval that is not empty and starts behind the last one's end. Touching intervals are the
   // caller's to merge. Amortised constant time; throws std::bad_alloc, which leaves the list as it was.
   void safe_push_back(const HalfOpenInterval<T>& h) {
-    VEMO_ASSERT(!h.empty());
     const ssize_t n = this->size();
-    VEMO_ASSERT_TEXT(n == 0 || (*this)[n - 1].t2 < h.t1, "(*this)[n-1].t2 < h.t1");
+    AssertMayFollow(n == 0, n == 0 ? T() : this->data()[n - 1].t2, h);
     this->push_back(h);
   }
 

@@ -82,6 +82,9 @@ class xvector {
     std::memcpy(m_buffer.appendbytes(kElementBytes), &copy, sizeof(T));
   }
 
+  // Appends `count` elements for the caller to fill in, and returns the first. Grows as push_back does.
+  T* AppendRaw(ssize_t count) { return reinterpret_cast<T*>(m_buffer.appendbytes(count * kElementBytes)); }
+
   // Replaces the contents by copies of [first, last), which must not lie in this vector. Leaves the vector
   // empty when it cannot be allocated.
   void assign(const T* first, const T* last) {

@@ -28,7 +28,8 @@ void Read64(BoundedReader& reader) {
   reader.ReadUint64();
 }
 void ReadField(BoundedReader& reader) {
-  reader.ReadFieldId();
+  FieldId field;
+  reader.ReadFieldId(field);
 }
 
 TEST(BoundedReader, ReadsNumbersOneAfterTheOther) {
@@ -67,6 +68,25 @@ TEST(BoundedReader, RefusesAWideNumberWhereANarrowOneBelongs) {
   EXPECT_EQ(reader.ReadUint32(), 0xFFFFFFFFu);
 }
 
+// Far from the end, where a number is read at once, as near it.
+TEST(BoundedReader, RefusesTheSameNumbersWhateverFollows) {
+  const auto followed = [](Bytes bytes, std::uint8_t by) {
+    bytes.insert(bytes.end(), 9, by);
+    return bytes;
+  };
+  for (const std::uint8_t by : {0x00, 0xFF}) {
+    ExpectRefusal(followed({0x80, 0x7F}, by), Read32, 0, "a number is not in its shortest form");
+    ExpectRefusal(followed({0xC0, 0x3F, 0xFF}, by), Read64, 0, "a number is not in its shortest form");
+    ExpectRefusal(followed({0xFE, 0, 0, 0, 0, 0, 0, 1}, by), Read64, 0, "a number is not in its shortest form");
+    ExpectRefusal(followed({0xFF, 0, 0, 0, 0, 0, 0, 0, 1}, by), Read64, 0, "a number is not in its shortest form");
+    ExpectRefusal(followed({0xF1, 0, 0, 0, 0}, by), Read32, 0, "a number has more than 32 bits");
+    const Bytes sound = followed({0xF0, 0xFF, 0xFF, 0xFF, 0xFF}, by);
+    BoundedReader reader(sound);
+    EXPECT_EQ(reader.ReadUint32(), 0xFFFFFFFFu);
+    EXPECT_EQ(reader.offset(), 5u);
+  }
+}
+
 TEST(BoundedReader, RefusesACountThatTheBytesCannotHold) {
   const auto readCount = [](BoundedReader& reader) { reader.ReadCount(3); };
   ExpectRefusal({0x02, 1, 2, 3, 4, 5}, readCount, 0, "the count 2 is more than the bytes can hold");
@@ -100,7 +120,9 @@ TEST(BoundedReader, ReadsAGuidAndRefusesAShortOne) {
 TEST(BoundedReader, ReadsAFieldAndRefusesAShortOne) {
   const Bytes bytes = {0x01, 0x02, 0x00, 0x03};
   BoundedReader reader(bytes);
-  EXPECT_EQ(reader.ReadFieldId(), (FieldId{OID(1), {0, 3}}));
+  FieldId field{OID(7), {1, 2, 3, 4}};
+  reader.ReadFieldId(field);
+  EXPECT_EQ(field, (FieldId{OID(1), {0, 3}}));
   reader.ExpectEnd();
   ExpectRefusal({0x01}, ReadField, 1, "the bytes end where a number should begin");
   ExpectRefusal({0x01, 0x02, 0x00}, ReadField, 1, "the count 2 is more than the bytes can hold");

@@ -8,6 +8,8 @@
 // No record tells the class of its children: that follows from the map's height.
 #pragma once
 
+#include <array>
+#include <cstddef>
 #include <memory>
 #include <string>
 #include <utility>
@@ -105,14 +107,14 @@ void TFieldMapLeafNode<Traits>::Deserialise(InputArchive& ar) {
   ssize_t n = 0;
   DeserialiseVariableLengthUint(ar, n);
   VEMO_ASSERT_TEXT(0 <= n && n <= Traits::kCapacity, "0 <= n && n <= 100");
-  ResizeArrayElements(m_entrys.Slot(0), m_numKeyEntrys, n);
-  m_numKeyEntrys = n;
-  for (ssize_t i = 0; i < n; ++i) {
-    // The key of an entry is constant, so it is replaced rather than assigned.
-    const FieldId* place = &GetEntry(i).first;
-    std::destroy_at(place);
-    ar >> *::new (const_cast<void*>(static_cast<const void*>(place))) FieldId;
-    ar >> GetEntry(i).second;
+  DestructArrayElements(m_entrys.Slot(0), std::exchange(m_numKeyEntrys, 0));
+  // An entry is counted before it is read, so that the node owns it whatever happens.
+  while (m_numKeyEntrys < n) {
+    auto* raw = reinterpret_cast<std::byte*>(m_entrys.Slot(m_numKeyEntrys));
+    auto* key = ::new (raw) FieldId;  // apart from its payload: the key of an entry is constant
+    auto* payload = ::new (raw + Traits::Map::GetPayloadOffset()) typename Traits::Payload;
+    ++m_numKeyEntrys;
+    ar >> *key >> *payload;
   }
 }
 
@@ -128,12 +130,20 @@ inline void CheckChild(BoundedReader& reader) {
   if (reader.ReadUint64() == 0) reader.Fail("a reference to a child is empty");
 }
 
-// Reads the next key of a node and sees that keys ascend.
-inline void CheckNextKey(BoundedReader& reader, FieldId& previous, bool first) {
-  FieldId key = reader.ReadFieldId();
-  if (!first && CompareKeys(previous, key) >= 0) reader.Fail("the keys of a node do not ascend");
-  previous = std::move(key);
-}
+// Reads the keys of a node and sees that they ascend.
+class KeyOrderCheck {
+ public:
+  void ReadNext(BoundedReader& reader) {
+    const FieldId& previous = m_keys[m_count % 2];
+    FieldId& key = m_keys[++m_count % 2];
+    reader.ReadFieldId(key);
+    if (m_count > 1 && CompareKeys(previous, key) >= 0) reader.Fail("the keys of a node do not ascend");
+  }
+
+ private:
+  std::array<FieldId, 2> m_keys;  // the last two, in turn
+  std::size_t m_count = 0;
+};
 
 inline std::uint32_t CheckNodeCount(BoundedReader& reader, std::uint32_t least, ssize_t capacity) {
   const std::uint32_t n = reader.ReadUint32();
@@ -163,9 +173,9 @@ void CheckForm(BoundedReader& reader, const TFieldMapInternalNode<Traits>*) {
   reader.ReadSchema(Traits::kInternalNodeSchema);
   CheckChild(reader);
   const std::uint32_t n = CheckNodeCount(reader, 1, Traits::kCapacity);
-  FieldId previous;
+  KeyOrderCheck keys;
   for (std::uint32_t i = 0; i < n; ++i) {
-    CheckNextKey(reader, previous, i == 0);
+    keys.ReadNext(reader);
     CheckChild(reader);
   }
 }
@@ -177,9 +187,9 @@ void CheckForm(BoundedReader& reader, const TFieldMapLeafNode<Traits>*) {
   const std::uint64_t next = reader.ReadUint64();
   if (prev == next && prev != 0) reader.Fail("a leaf has the same neighbour on both sides");
   const std::uint32_t n = CheckNodeCount(reader, 0, Traits::kCapacity);
-  FieldId previous;
+  KeyOrderCheck keys;
   for (std::uint32_t i = 0; i < n; ++i) {
-    CheckNextKey(reader, previous, i == 0);
+    keys.ReadNext(reader);
     CheckForm(reader, static_cast<const typename Traits::Payload*>(nullptr));
   }
 }
