@@ -10,6 +10,7 @@
 #include "store/commit_outcome.h"
 #include "store/decoded_object.h"
 #include "store/envelope.h"
+#include "store/root_value.h"
 #include "store/snapshot.h"
 
 namespace vemo {

@@ -7,6 +7,7 @@
 #include "store/id_set.h"
 #include "store/map_check.h"
 #include "store/raw_check.h"
+#include "store/root_value.h"
 #include "vxOperation/src/WorkingSet/CompOp/VectorOT.h"
 
 namespace vemo {

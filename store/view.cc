@@ -6,6 +6,7 @@
 
 #include "platform/error.h"
 #include "store/envelope.h"
+#include "store/root_value.h"
 #include "vxUtils/Archive.h"
 
 namespace vemo {
@@ -62,37 +63,7 @@ std::string_view NameOf(const IPersistable::FnTable* table) {
 
 }  // namespace
 
-RootValue DecodeRootValue(std::string_view name, ByteView sealed) {
-  const ByteView value = OpenNamed(NamedTable::kRoots, name, sealed);
-  BoundedReader reader(value);
-  RootValue root;
-  root.oid = OID(reader.ReadUint64());
-  root.className.assign(value.begin() + static_cast<std::ptrdiff_t>(reader.offset()), value.end());
-  return root;
-}
-
 View* ReadingView() noexcept { return t_readingView; }
-
-ObjSysState& SysStateOf(ptr<const IPersistable> object) noexcept {
-  return *object.Table()->_IObject.GetSysState(object.m_self);
-}
-
-PersistObjState& PersistStateOf(ptr<const IPersistable> object) noexcept {
-  return *object.Table()->GetPersistObjState(object.m_self);
-}
-
-void DestroyObject(ptr<IPersistable> object) noexcept {
-  SysStateOf(object).ClearFlag(ObjSysState::kDirtyFlag);
-  object.Table()->_IObject.OnGarbageCollect(object.m_self);
-  object.Table()->_IObject.Destroy(object.m_self);
-}
-
-Bytes EncodeRootValue(std::string_view name, const RootValue& value) {
-  std::uint8_t oid[kMaxVariableLengthUint64Bytes];
-  Bytes bytes(oid, SerialiseVariableLengthUint64(oid, value.oid.m_value));
-  bytes.insert(bytes.end(), value.className.begin(), value.className.end());
-  return SealNamed(NamedTable::kRoots, name, bytes);
-}
 
 View::View(CSpace& space, std::string spaceName, Kind kind, CacheCounters& counters, std::uint64_t seed)
     : m_space(space),

@@ -31,30 +31,12 @@
 
 #include "store/class_registry.h"
 #include "store/engine.h"
+#include "store/object_state.h"
 #include "store/residents.h"
 #include "store/use_check.h"
 #include "vxPersistStore/pref.h"
 
 namespace vemo {
-
-// Bits of ObjSysState::objflags_ that the store uses beside the dirty flag.
-inline constexpr int kSnapshotFlag = 2;  // the object belongs to a snapshot and must not be marked
-inline constexpr int kDeletedFlag = 3;   // the object was deleted in the open transaction
-
-ObjSysState& SysStateOf(ptr<const IPersistable> object) noexcept;
-PersistObjState& PersistStateOf(ptr<const IPersistable> object) noexcept;
-
-// Clears the dirty flag, tells the object that it is collected, and ends it.
-void DestroyObject(ptr<IPersistable> object) noexcept;
-
-// The value of a root: which map stands behind a name.
-struct RootValue {
-  std::string className;
-  OID oid;
-};
-Bytes EncodeRootValue(std::string_view name, const RootValue& value);
-// Throws MalformedBytes.
-RootValue DecodeRootValue(std::string_view name, ByteView sealed);
 
 class View {
  public:

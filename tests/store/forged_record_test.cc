@@ -1,6 +1,7 @@
 // Records whose checksums are right and whose contents are not.
 #include "platform/variable_length.h"
 #include "store/envelope.h"
+#include "store/root_value.h"
 #include "tests/store/store_fixture.h"
 
 namespace vemo::test {
