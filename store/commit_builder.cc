@@ -101,9 +101,9 @@ void CommitBuilder::Encode(OID oid, ptr<IPersistable> object) {
 }
 
 std::uint32_t CommitBuilder::ClassNumber(const ClassEntry& classEntry) {
-  if (const std::uint32_t known = m_view.ClassNumber(classEntry)) return known;
-  const std::uint32_t added = m_view.AddClassNumber(classEntry);
-  m_batch.namedValues.push_back(m_view.ClassNumberValue(added));
+  if (const std::uint32_t known = m_view.Classes().NumberOf(classEntry)) return known;
+  const std::uint32_t added = m_view.Classes().Add(classEntry);
+  m_batch.namedValues.push_back(m_view.Classes().StoredValue(added));
   return added;
 }
 

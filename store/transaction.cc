@@ -467,7 +467,7 @@ void WriteTransaction::Commit() {
                               ": a change was interrupted half-way by an exception; abort this transaction and begin again");
   }
   vemo::View& view = m_space.m_writerView;
-  const std::size_t classesBefore = view.NumClassNumbers();
+  const std::size_t classesBefore = view.Classes().Size();
   CommitBuilder builder(view, m_space, m_new, m_deletedIds);
   CommitBatch& batch = builder.Batch();
   try {
@@ -497,10 +497,10 @@ void WriteTransaction::Commit() {
     AfterCommit(generation, builder.Written());
   } catch (const UnknownOutcome&) {
     m_poisoned = true;
-    view.TruncateClassNumbers(classesBefore);
+    view.Classes().Truncate(classesBefore);
     throw;
   } catch (...) {
-    view.TruncateClassNumbers(classesBefore);
+    view.Classes().Truncate(classesBefore);
     Reattach();
     throw;
   }
@@ -523,7 +523,7 @@ void WriteTransaction::AddChanged(CommitBuilder& builder) const {
 WriteTransaction::DirtySize WriteTransaction::Dirty() const {
   RequireOpen();
   vemo::View& view = m_space.m_writerView;
-  const std::size_t classesBefore = view.NumClassNumbers();
+  const std::size_t classesBefore = view.Classes().Size();
   DirtySize dirty;
   try {
     CommitBuilder builder(view, m_space, m_new, m_deletedIds);
@@ -533,10 +533,10 @@ WriteTransaction::DirtySize WriteTransaction::Dirty() const {
       dirty.bytes += record.bytes.size();
     }
   } catch (...) {
-    view.TruncateClassNumbers(classesBefore);
+    view.Classes().Truncate(classesBefore);
     throw;
   }
-  view.TruncateClassNumbers(classesBefore);
+  view.Classes().Truncate(classesBefore);
   return dirty;
 }
 

@@ -1,7 +1,6 @@
 #include "store/view.h"
 
 #include <algorithm>
-#include <charconv>
 #include <utility>
 
 #include "platform/error.h"
@@ -41,20 +40,6 @@ class UnbindVisitor : public IObjectVisitor {
   const View* m_view;
 };
 
-constexpr std::string_view kClassPrefix = "class/";
-constexpr std::size_t kMaxClassNumber = 1'000'000;  // far above what classes there can be, and an array that long is small
-
-std::string ClassNumberName(std::size_t number) { return std::string(kClassPrefix) + std::to_string(number); }
-
-std::size_t ParseClassNumber(std::string_view text) {
-  std::size_t number = 0;
-  const auto result = std::from_chars(text.data(), text.data() + text.size(), number);
-  if (result.ec != std::errc() || result.ptr != text.data() + text.size() || number == 0 || number > kMaxClassNumber) {
-    throw MalformedBytes(0, "its name ends in no class number");
-  }
-  return number;
-}
-
 // Empty for a table that is null or of no class of the maps.
 std::string_view NameOf(const IPersistable::FnTable* table) {
   const ClassEntry* found = table == nullptr ? nullptr : FindClass(table);
@@ -84,9 +69,9 @@ void View::Attach(std::unique_ptr<EngineSnapshot> state) {
   if (moved || m_rootsAreStale) ForgetResidents();
   if (moved) {
     m_generation = m_state->Generation();
-    m_classes.clear();
+    m_classes.Clear();
   }
-  if (m_classes.empty()) ReadClassNumbers();
+  if (m_classes.Size() == 0) m_classes.Read(State(), m_spaceName);
   if (m_rootsAreStale) ReloadRoots();
 }
 
@@ -126,7 +111,7 @@ void View::MoveTo(std::unique_ptr<EngineSnapshot> state) {
   Unbind(gone);
   for (auto& [name, root] : m_roots) ResetInPlace(root);
   m_rootsAreStale = true;
-  ReadClassNumbers();
+  m_classes.Read(State(), m_spaceName);
   ReloadRoots();
 }
 
@@ -254,56 +239,16 @@ ptr<IPersistable> View::Decode(OID oid, ByteView record, const IPersistable::FnT
   }
 }
 
-// --- Classes ---
-
-void View::ReadClassNumbers() {
-  std::vector<const ClassEntry*> classes;  // taken over when all of it was read: a part would give numbers out twice
-  State().ScanNamed(NamedTable::kInfo, kClassPrefix, [&](std::string_view name, ByteView sealed) {
-    try {
-      const ByteView value = OpenNamed(NamedTable::kInfo, name, sealed);
-      const std::size_t number = ParseClassNumber(name.substr(kClassPrefix.size()));
-      if (classes.size() < number) classes.resize(number);
-      classes[number - 1] = FindClass(std::string_view(reinterpret_cast<const char*>(value.data()), value.size()));
-    } catch (const MalformedBytes& malformed) {
-      throw CorruptRecord(m_spaceName + ": class table, \"" + std::string(name) + "\": " + malformed.what(),
-                          Place(OID()));
-    }
-    return true;
-  });
-  m_classes = std::move(classes);
-}
-
-const ClassEntry* View::FindClassNumber(std::uint32_t number) const noexcept {
-  return number == 0 || number > m_classes.size() ? nullptr : m_classes[number - 1];
-}
-
 const ClassEntry& View::ClassOf(OID oid, std::uint32_t number, const IPersistable::FnTable* expected) const {
-  if (const ClassEntry* found = FindClassNumber(number)) return *found;
+  if (const ClassEntry* found = m_classes.Find(number)) return *found;
   throw CorruptRecord(
       Describe(oid, NameOf(expected), "its class number " + std::to_string(number) + " names no class known here"),
       Place(oid, NameOf(expected)));
 }
 
 std::string_view View::ClassInHead(ByteView record) const noexcept {
-  const ClassEntry* found = FindClassNumber(ClassNumberOfRecord(record));
+  const ClassEntry* found = m_classes.Find(ClassNumberOfRecord(record));
   return found == nullptr ? std::string_view() : found->Name();
-}
-
-std::uint32_t View::ClassNumber(const ClassEntry& classEntry) const noexcept {
-  const auto found = std::find(m_classes.begin(), m_classes.end(), &classEntry);
-  return found == m_classes.end() ? 0 : static_cast<std::uint32_t>(found - m_classes.begin()) + 1;
-}
-
-std::uint32_t View::AddClassNumber(const ClassEntry& classEntry) {
-  m_classes.push_back(&classEntry);
-  return static_cast<std::uint32_t>(m_classes.size());
-}
-
-CommitBatch::NamedValue View::ClassNumberValue(std::size_t number) const {
-  const std::string name = ClassNumberName(number);
-  const std::string_view className = m_classes[number - 1]->Name();
-  const ByteView value(reinterpret_cast<const std::uint8_t*>(className.data()), className.size());
-  return {NamedTable::kInfo, name, SealNamed(NamedTable::kInfo, name, value)};
 }
 
 // --- Roots ---

@@ -29,6 +29,7 @@
 #include <string_view>
 #include <vector>
 
+#include "store/class_numbers.h"
 #include "store/class_registry.h"
 #include "store/engine.h"
 #include "store/object_state.h"
@@ -127,22 +128,15 @@ class View {
   // Reads all root maps anew after ForgetResidents; until it has succeeded, Attach tries again.
   void ReloadRoots();
 
-  // The number by which records of this space name a class; 0 when no record does yet.
-  std::uint32_t ClassNumber(const ClassEntry& classEntry) const noexcept;
-  std::uint32_t AddClassNumber(const ClassEntry& classEntry);
-  std::size_t NumClassNumbers() const noexcept { return m_classes.size(); }
-  void TruncateClassNumbers(std::size_t count) noexcept { m_classes.resize(count); }
-  // What a commit stores for the class of that number.
-  CommitBatch::NamedValue ClassNumberValue(std::size_t number) const;
+  // The numbers of classes in the view's commit, and those that the open transaction has given out.
+  ClassNumbers& Classes() noexcept { return m_classes; }
 
   // The message of an exception about object `oid`.
   std::string Describe(OID oid, std::string_view className, std::string_view reason) const;
   ErrorPlace Place(OID oid, std::string_view className = "", std::string_view root = "") const;
 
  private:
-  const ClassEntry* FindClassNumber(std::uint32_t number) const noexcept;
   const ClassEntry& ClassOf(OID oid, std::uint32_t number, const IPersistable::FnTable* expected) const;
-  void ReadClassNumbers();
   void ReadRoot(std::string_view name, Root& root);
   void Own(ptr<IPersistable> object, OID oid) noexcept;
   // Takes all references of the view to these objects back to the unbound state.
@@ -155,7 +149,7 @@ class View {
   std::function<bool()> m_expiry;
   std::uint64_t m_generation = 0;
   bool m_rootsAreStale = false;
-  std::vector<const ClassEntry*> m_classes;  // number - 1 -> class; null where this program does not know it
+  ClassNumbers m_classes;
   mutable std::mutex m_tablesMutex;  // held where the residents or the roots change, for Holds
   Residents m_residents;
   UseCheck m_use;
