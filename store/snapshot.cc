@@ -82,14 +82,14 @@ Snapshot::~Snapshot() {
 
 ptr<IPersistable> Snapshot::RootMap(std::string_view name) {
   const UseCheck::Scope use(m_view.Use(), m_space.Name(), m_view.UseName());
-  const View::Root* root = m_view.FindRoot(name);
+  const RootMaps::Root* root = m_view.Roots().Find(name);
   if (root == nullptr) throw UsageError(m_space.Name() + ": it has no root map \"" + std::string(name) + "\"");
   return root->map;
 }
 
 void Snapshot::RefuseRoot(std::string_view name, const IPersistable::FnTable* table) {
   throw UsageError(m_space.Name() + ": root \"" + std::string(name) + "\" is a " +
-                   std::string(m_view.FindRoot(name)->classEntry->Name()) + ", not a " +
+                   std::string(m_view.Roots().Find(name)->classEntry->Name()) + ", not a " +
                    std::string(FindClass(table)->Name()));
 }
 
@@ -123,7 +123,7 @@ bool Snapshot::ForgetIfHolds(OID oid, const void* self) noexcept {
   if (!m_view.Holds(oid, self)) return false;
   m_view.ForgetResidents();
   try {
-    m_view.ReloadRoots();
+    m_view.Roots().Reload();
   } catch (const std::exception&) {
     // The roots stay stale, and whoever asks for one next gets the exception.
   }

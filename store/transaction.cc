@@ -101,9 +101,9 @@ WriteTransaction::~WriteTransaction() {
     view.ForgetResidents();
     try {
       for (auto renamed = m_renamedRoots.rbegin(); renamed != m_renamedRoots.rend(); ++renamed) {
-        view.RenameRoot(renamed->to, renamed->from);
+        view.Roots().Rename(renamed->to, renamed->from);
       }
-      view.ReloadRoots();
+      view.Roots().Reload();
     } catch (const std::exception&) {
       // The roots stay stale, and the next transaction reads them or throws.
     }
@@ -114,7 +114,7 @@ WriteTransaction::~WriteTransaction() {
 bool WriteTransaction::HasChanges() const noexcept {
   if (m_space.m_disturbed.exchange(false)) return true;
   if (m_poisoned || !m_dirty.empty() || !m_new.empty() || !m_deletedIds.empty() || !m_removedRoots.empty()) return true;
-  for (const auto& [name, root] : m_space.m_writerView.Roots()) {
+  for (const auto& [name, root] : m_space.m_writerView.Roots().All()) {
     if (!root.committed && !root.oid.IsNull()) return true;
   }
   return false;
@@ -146,17 +146,17 @@ void WriteTransaction::RequireOpen() const {
 // --- Roots ---
 
 // The root of that name as the transaction has left it, which the engine's state does not know yet.
-vemo::View::Root* WriteTransaction::FindAnyRoot(std::string_view name) const {
+RootMaps::Root* WriteTransaction::FindAnyRoot(std::string_view name) const {
   RequireOpen();
-  auto& roots = m_space.m_writerView.Roots();
+  auto& roots = m_space.m_writerView.Roots().All();
   const auto found = roots.find(name);
   if (found != roots.end() && !found->second.oid.IsNull()) return &found->second;
-  return IsRemoved(name) ? nullptr : m_space.m_writerView.FindRoot(name);
+  return IsRemoved(name) ? nullptr : m_space.m_writerView.Roots().Find(name);
 }
 
-vemo::View::Root* WriteTransaction::FindRootOfClass(std::string_view name, const ClassEntry& classEntry) {
+RootMaps::Root* WriteTransaction::FindRootOfClass(std::string_view name, const ClassEntry& classEntry) {
   RequireOpen();
-  vemo::View::Root* root = FindAnyRoot(name);
+  RootMaps::Root* root = FindAnyRoot(name);
   if (root != nullptr && root->classEntry != &classEntry) {
     throw UsageError(m_space.Name() + ": root \"" + std::string(name) + "\" is a " +
                      std::string(root->classEntry->Name()) + ", not a " + std::string(classEntry.Name()));
@@ -165,7 +165,7 @@ vemo::View::Root* WriteTransaction::FindRootOfClass(std::string_view name, const
 }
 
 void* WriteTransaction::FindExistingRoot(std::string_view name, const IPersistable::FnTable* table) {
-  const vemo::View::Root* root = FindRootOfClass(name, MapClass(table));
+  const RootMaps::Root* root = FindRootOfClass(name, MapClass(table));
   if (root == nullptr) throw UsageError(m_space.Name() + ": it has no root map \"" + std::string(name) + "\"");
   return root->map.m_self;
 }
@@ -173,12 +173,12 @@ void* WriteTransaction::FindExistingRoot(std::string_view name, const IPersistab
 void* WriteTransaction::FindOrMakeRoot(std::string_view name, const IPersistable::FnTable* table) {
   CheckRootName(name);
   const ClassEntry& classEntry = MapClass(table);
-  if (const vemo::View::Root* root = FindRootOfClass(name, classEntry)) return root->map.m_self;
+  if (const RootMaps::Root* root = FindRootOfClass(name, classEntry)) return root->map.m_self;
   return MakeRoot(name, classEntry);
 }
 
 void* WriteTransaction::MakeRoot(std::string_view name, const ClassEntry& classEntry) {
-  return m_space.m_writerView.AddRoot(name, classEntry, m_space.NextId()).map.m_self;
+  return m_space.m_writerView.Roots().Add(name, classEntry, m_space.NextId()).map.m_self;
 }
 
 std::string WriteTransaction::OwnedRootName(OID oid) {
@@ -188,7 +188,7 @@ std::string WriteTransaction::OwnedRootName(OID oid) {
 void* WriteTransaction::MakeOwnedRoot(const IPersistable::FnTable* table) {
   RequireOpen();
   const OID oid = m_space.NextId();
-  return m_space.m_writerView.AddRoot(OwnedRootName(oid), MapClass(table), oid).map.m_self;
+  return m_space.m_writerView.Roots().Add(OwnedRootName(oid), MapClass(table), oid).map.m_self;
 }
 
 void WriteTransaction::ReserveIdsUpTo(OID last) {
@@ -203,14 +203,14 @@ void* WriteTransaction::RestoreOwnedRoot(OID oid, const IPersistable::FnTable* t
   if (FindAnyRoot(OwnedRootName(oid)) != nullptr || m_space.m_writerView.State().Read(oid)) {
     throw UsageError(m_space.m_writerView.Describe(oid, "", "the space has an object of that id already"));
   }
-  return m_space.m_writerView.AddRoot(OwnedRootName(oid), MapClass(table), oid).map.m_self;
+  return m_space.m_writerView.Roots().Add(OwnedRootName(oid), MapClass(table), oid).map.m_self;
 }
 
 OID WriteTransaction::RequireOwnedRoot(ptr<const IPersistable> map) {
   RequireOpen();
   RequireOwn(map);
   const OID oid = PersistStateOf(map).m_oid;
-  if (m_space.m_writerView.FindRoot(OwnedRootName(oid)) == nullptr) {
+  if (m_space.m_writerView.Roots().Find(OwnedRootName(oid)) == nullptr) {
     throw UsageError(m_space.m_writerView.Describe(oid, "", "it is a root with a name, not a map that was made by Own"));
   }
   return oid;
@@ -223,7 +223,7 @@ std::vector<std::string> WriteTransaction::RootNames() const {
     if (name.front() != '\0' && !IsRemoved(name)) names.emplace(name);
     return true;
   });
-  for (const auto& [name, root] : m_space.m_writerView.Roots()) {
+  for (const auto& [name, root] : m_space.m_writerView.Roots().All()) {
     if (!root.oid.IsNull() && name.front() != '\0') names.insert(name);
   }
   return {names.begin(), names.end()};
@@ -235,12 +235,12 @@ bool WriteTransaction::IsRemoved(std::string_view name) const {
 
 void WriteTransaction::RenameRoot(std::string_view from, std::string_view to) {
   CheckRootName(to);
-  vemo::View::Root* root = FindAnyRoot(from);
+  RootMaps::Root* root = FindAnyRoot(from);
   if (root == nullptr) throw UsageError(m_space.Name() + ": it has no root map \"" + std::string(from) + "\"");
   if (FindAnyRoot(to) != nullptr) throw UsageError(m_space.Name() + ": it has a root map \"" + std::string(to) + "\" already");
   m_removedRoots.push_back({std::string(from), OID()});
   m_renamedRoots.push_back({std::string(from), std::string(to)});
-  m_space.m_writerView.RenameRoot(from, to).committed = false;
+  m_space.m_writerView.Roots().Rename(from, to).committed = false;
 }
 
 void WriteTransaction::DeleteRoot(std::string_view name) {
@@ -250,7 +250,7 @@ void WriteTransaction::DeleteRoot(std::string_view name) {
 }
 
 void WriteTransaction::DeleteRootObject(const std::string& name) {
-  vemo::View::Root& root = *FindAnyRoot(name);
+  RootMaps::Root& root = *FindAnyRoot(name);
   try {
     for (const prefbase& child : OwnedReferences(root.map)) DeleteSubTree(child.Get());
     m_removedRoots.push_back({name, root.oid});
@@ -261,11 +261,11 @@ void WriteTransaction::DeleteRootObject(const std::string& name) {
   m_dirty.erase(root.oid);
   root.oid = OID();
   root.committed = false;
-  m_space.m_writerView.ResetInPlace(root);
+  m_space.m_writerView.Roots().ResetInPlace(root);
 }
 
 void WriteTransaction::AddRemovedRoots(CommitBatch& batch) const {
-  const auto& roots = m_space.m_writerView.Roots();
+  const auto& roots = m_space.m_writerView.Roots().All();
   for (const RemovedRoot& removed : m_removedRoots) {
     const auto again = roots.find(removed.name);  // another root may have got the name since
     if (again == roots.end() || again->second.oid.IsNull()) {
@@ -509,7 +509,7 @@ void WriteTransaction::Commit() {
 
 // Every dirty object that has a record, every root without one, and what is new below them.
 void WriteTransaction::AddChanged(CommitBuilder& builder) const {
-  for (auto& [name, root] : m_space.m_writerView.Roots()) {
+  for (auto& [name, root] : m_space.m_writerView.Roots().All()) {
     if (root.committed || root.oid.IsNull()) continue;
     builder.Add(root.oid, root.map);
     builder.Batch().namedValues.push_back(
@@ -567,7 +567,7 @@ void WriteTransaction::AfterCommit(std::uint64_t generation, const std::unordere
     DestroyObject(unreached);
   }
   for (const OID oid : written) view.Written(oid, generation);
-  for (auto& [name, root] : view.Roots()) root.committed = !root.oid.IsNull();
+  for (auto& [name, root] : view.Roots().All()) root.committed = !root.oid.IsNull();
   m_dirty.clear();
   m_new.clear();
   view.Advance(generation);

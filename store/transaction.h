@@ -157,7 +157,7 @@ class WriteTransaction {
   void* RestoreOwnedRoot(OID oid, const IPersistable::FnTable* table);
   OID RequireOwnedRoot(ptr<const IPersistable> map);
   void DeleteRootObject(const std::string& name);
-  vemo::View::Root* FindRootOfClass(std::string_view name, const ClassEntry& classEntry);
+  RootMaps::Root* FindRootOfClass(std::string_view name, const ClassEntry& classEntry);
   void* MakeRoot(std::string_view name, const ClassEntry& classEntry);
 
   void DeleteResidents(ptr<IPersistable> root, std::vector<std::vector<OID>>& absent);
@@ -165,7 +165,7 @@ class WriteTransaction {
   bool HasDirtyNodes() const noexcept;
 
   bool HasChanges() const noexcept;
-  vemo::View::Root* FindAnyRoot(std::string_view name) const;
+  RootMaps::Root* FindAnyRoot(std::string_view name) const;
   bool IsRemoved(std::string_view name) const;
   void AddChanged(CommitBuilder& builder) const;
   void AddRemovedRoots(CommitBatch& batch) const;

@@ -1,11 +1,9 @@
 #include "store/view.h"
 
-#include <algorithm>
 #include <utility>
 
 #include "platform/error.h"
 #include "store/envelope.h"
-#include "store/root_value.h"
 #include "vxUtils/Archive.h"
 
 namespace vemo {
@@ -55,24 +53,21 @@ View::View(CSpace& space, std::string spaceName, Kind kind, CacheCounters& count
       m_spaceName(std::move(spaceName)),
       m_kind(kind),
       m_residents(counters, seed),
-      m_counters(counters) {}
+      m_counters(counters),
+      m_roots(*this) {}
 
-View::~View() {
-  ForgetResidents();
-  for (auto& [name, root] : m_roots) DestroyObject(root.map);
-  for (Root& root : m_retiredRoots) DestroyObject(root.map);
-}
+View::~View() { ForgetResidents(); }
 
 void View::Attach(std::unique_ptr<EngineSnapshot> state) {
   const bool moved = state->Generation() != m_generation;
   m_state = std::move(state);
-  if (moved || m_rootsAreStale) ForgetResidents();
+  if (moved || m_roots.AreStale()) ForgetResidents();
   if (moved) {
     m_generation = m_state->Generation();
     m_classes.Clear();
   }
   if (m_classes.Size() == 0) m_classes.Read(State(), m_spaceName);
-  if (m_rootsAreStale) ReloadRoots();
+  if (m_roots.AreStale()) m_roots.Reload();
 }
 
 const EngineSnapshot& View::State() const {
@@ -90,7 +85,7 @@ const EngineSnapshot& View::State() const {
 // What did not change keeps its place in memory: a record that the same commit wrote has the same bytes. References to what
 // did change are unbound.
 void View::MoveTo(std::unique_ptr<EngineSnapshot> state) {
-  if (state->Generation() == m_generation && !m_rootsAreStale) {
+  if (state->Generation() == m_generation && !m_roots.AreStale()) {
     m_state = std::move(state);
     return;
   }
@@ -109,20 +104,17 @@ void View::MoveTo(std::unique_ptr<EngineSnapshot> state) {
     Release(oid);
   }
   Unbind(gone);
-  for (auto& [name, root] : m_roots) ResetInPlace(root);
-  m_rootsAreStale = true;
+  m_roots.Forget();
   m_classes.Read(State(), m_spaceName);
-  ReloadRoots();
+  m_roots.Reload();
 }
 
 void View::Unbind(const IdSet& ids) const {
   UnbindVisitor visitor(ids, this);
-  const auto visit = [&visitor](ptr<const IPersistable> object) {
-    object.Table()->_IObject.VisitObjects(object.m_self, visitor);
-  };
-  for (const auto& [oid, resident] : m_residents.All()) visit(resident.object);
-  for (const auto& [name, root] : m_roots) visit(root.map);
-  for (const Root& root : m_retiredRoots) visit(root.map);
+  for (const auto& [oid, resident] : m_residents.All()) {
+    resident.object.Table()->_IObject.VisitObjects(resident.object.m_self, visitor);
+  }
+  m_roots.VisitObjects(visitor);
 }
 
 bool View::Trim(std::size_t allowance) {
@@ -161,21 +153,21 @@ void View::Own(ptr<IPersistable> object, OID oid) noexcept {
 }
 
 bool View::Holds(OID oid, const void* self) const {
-  const std::lock_guard lock(m_tablesMutex);
-  const auto isRoot = [self](const auto& entry) { return entry.second.map.m_self == self; };
-  return Find(oid).m_self == self || std::any_of(m_roots.begin(), m_roots.end(), isRoot);
+  if (m_roots.Holds(self)) return true;
+  const std::lock_guard lock(m_residentsMutex);
+  return Find(oid).m_self == self;
 }
 
 void View::Adopt(OID oid, ptr<IPersistable> object, std::uint64_t commit) {
   {
-    const std::lock_guard lock(m_tablesMutex);
+    const std::lock_guard lock(m_residentsMutex);
     m_residents.Add(oid, object, commit);
   }
   Own(object, oid);
 }
 
 void View::Release(OID oid) noexcept {
-  const std::lock_guard lock(m_tablesMutex);
+  const std::lock_guard lock(m_residentsMutex);
   m_residents.Remove(oid);
 }
 
@@ -223,9 +215,7 @@ ptr<IPersistable> View::Decode(OID oid, ByteView record, const IPersistable::FnT
     classEntry.checkForm(reader);
     reader.ExpectEnd();
     object = ptr<IPersistable>(classEntry.reflected->m_createFn().m_self, classEntry.table);
-    const ReadingScope scope(this);
-    InputArchive archive(envelope.body.data());
-    classEntry.table->Deserialise(object.m_self, archive);
+    ReadBody(object, envelope.body);
     return object;
   } catch (const MalformedBytes& malformed) {
     if (object.m_self != nullptr) DestroyObject(object);
@@ -237,6 +227,14 @@ ptr<IPersistable> View::Decode(OID oid, ByteView record, const IPersistable::FnT
     if (object.m_self != nullptr) DestroyObject(object);
     throw;
   }
+}
+
+void View::DecodeInto(ptr<IPersistable> object, OID oid, ByteView record) { ReadBody(object, OpenRecord(record, oid).body); }
+
+void View::ReadBody(ptr<IPersistable> object, ByteView body) {
+  const ReadingScope scope(this);
+  InputArchive archive(body.data());
+  object.Table()->Deserialise(object.m_self, archive);
 }
 
 const ClassEntry& View::ClassOf(OID oid, std::uint32_t number, const IPersistable::FnTable* expected) const {
@@ -251,133 +249,14 @@ std::string_view View::ClassInHead(ByteView record) const noexcept {
   return found == nullptr ? std::string_view() : found->Name();
 }
 
-// --- Roots ---
-
-View::Root* View::FindRoot(std::string_view name) {
-  if (m_rootsAreStale) ReloadRoots();
-  auto found = m_roots.find(name);
-  if (found != m_roots.end() && !found->second.oid.IsNull()) return &found->second;
-  const std::optional<ByteView> sealed = State().ReadNamed(NamedTable::kRoots, name);
-  if (!sealed) return nullptr;
-  RootValue value;
-  try {
-    value = DecodeRootValue(name, *sealed);
-  } catch (const MalformedBytes& malformed) {
-    throw CorruptRecord(m_spaceName + ": root \"" + std::string(name) + "\": " + malformed.what(),
-                        Place(OID(), "", name));
-  }
-  const ClassEntry* classEntry = FindClass(value.className);
-  if (classEntry == nullptr || !classEntry->isMap) {
-    throw IncompatibleSpace(m_spaceName + ": root \"" + std::string(name) + "\" is a " + value.className +
-                            ", which this program does not know");
-  }
-  Root& root = AddRoot(name, *classEntry, value.oid);
-  try {
-    ReadRoot(name, root);
-  } catch (...) {
-    root.oid = OID();
-    throw;
-  }
-  return &root;
-}
-
-View::Root& View::AddRoot(std::string_view name, const ClassEntry& classEntry, OID oid) {
-  const std::lock_guard lock(m_tablesMutex);
-  auto found = m_roots.find(name);
-  if (found != m_roots.end() && found->second.classEntry != &classEntry) {
-    m_retiredRoots.push_back(found->second);
-    m_retiredRoots.back().oid = OID();
-    m_roots.erase(found);
-    found = m_roots.end();
-  }
-  if (found == m_roots.end()) {
-    found = m_roots.emplace(std::string(name), Root{&classEntry, OID(), {}, false}).first;
-    try {
-      found->second.map = ptr<IPersistable>(classEntry.reflected->m_createFn().m_self, classEntry.table);
-    } catch (...) {
-      m_roots.erase(found);
-      throw;
-    }
-  }
-  found->second.oid = oid;
-  Own(found->second.map, oid);
-  return found->second;
-}
-
-View::Root& View::RenameRoot(std::string_view from, std::string_view to) {
-  const std::lock_guard lock(m_tablesMutex);
-  if (const auto absent = m_roots.find(to); absent != m_roots.end()) {
-    m_retiredRoots.push_back(absent->second);
-    m_roots.erase(absent);
-  }
-  auto node = m_roots.extract(m_roots.find(from));
-  node.key() = std::string(to);
-  return m_roots.insert(std::move(node)).position->second;
-}
-
-// Reads the record of a root into its map, which is in the default state.
-void View::ReadRoot(std::string_view name, Root& root) {
-  const std::optional<ByteView> record = State().Read(root.oid);
-  if (!record) {
-    throw DanglingReference(Describe(root.oid, root.classEntry->Name(),
-                                     "root \"" + std::string(name) + "\" has no record (run vemo verify)"),
-                            Place(root.oid, root.classEntry->Name(), name));
-  }
-  const ptr<IPersistable> read = Decode(root.oid, *record, root.classEntry->table);
-  const bool isOfClass = read.Table() == root.map.Table();
-  if (isOfClass) {
-    // Decode checked the record; reading it once more, into the map at its fixed address, cannot fail.
-    const ReadingScope scope(this);
-    InputArchive archive(OpenRecord(*record, root.oid).body.data());
-    root.map.Table()->Deserialise(root.map.m_self, archive);
-  }
-  DestroyObject(read);
-  if (!isOfClass) {
-    throw CorruptRecord(Describe(root.oid, FindClass(read.Table())->Name(),
-                                 "root \"" + std::string(name) + "\" should be a " + std::string(root.classEntry->Name())),
-                        Place(root.oid, FindClass(read.Table())->Name(), name));
-  }
-  root.committed = true;
-}
-
-void View::ResetInPlace(Root& root) noexcept {
-  SysStateOf(root.map).ClearFlag(ObjSysState::kDirtyFlag);
-  const TypeOps& ops = root.classEntry->reflected->m_ops;
-  ops.m_DestructArrayFn(root.map.m_self, ops.m_size, 1);
-  ops.m_ConstructArrayFn(root.map.m_self, ops.m_size, 1);
-  Own(root.map, root.oid);
-}
-
 void View::ForgetResidents() noexcept {
   Residents::Table forgotten;
   {
-    const std::lock_guard lock(m_tablesMutex);
+    const std::lock_guard lock(m_residentsMutex);
     forgotten = m_residents.TakeAll();
   }
   for (const auto& [oid, resident] : forgotten) DestroyObject(resident.object);
-  for (auto& [name, root] : m_roots) {
-    if (!root.committed) root.oid = OID();
-    ResetInPlace(root);
-    m_rootsAreStale = true;
-  }
-  for (Root& root : m_retiredRoots) ResetInPlace(root);  // a refused change may have left them half-changed
-}
-
-void View::ReloadRoots() {
-  for (auto& [name, root] : m_roots) {
-    root.oid = OID();
-    root.committed = false;
-    Own(root.map, OID());
-  }
-  std::vector<std::string> names;
-  for (const auto& [name, root] : m_roots) names.push_back(name);
-  m_rootsAreStale = false;
-  try {
-    for (const std::string& name : names) FindRoot(name);
-  } catch (...) {
-    m_rootsAreStale = true;
-    throw;
-  }
+  m_roots.Forget();
 }
 
 }  // namespace vemo

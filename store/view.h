@@ -22,7 +22,6 @@
 
 #include <cstdint>
 #include <functional>
-#include <map>
 #include <memory>
 #include <mutex>
 #include <string>
@@ -34,6 +33,7 @@
 #include "store/engine.h"
 #include "store/object_state.h"
 #include "store/residents.h"
+#include "store/root_maps.h"
 #include "store/use_check.h"
 #include "vxPersistStore/pref.h"
 
@@ -42,14 +42,6 @@ namespace vemo {
 class View {
  public:
   enum class Kind : std::uint8_t { kWriter, kSnapshot };
-
-  // A root map keeps its address as long as the view lives. A root that is not (or no longer) in the space has a null id.
-  struct Root {
-    const ClassEntry* classEntry = nullptr;
-    OID oid;
-    ptr<IPersistable> map;
-    bool committed = false;
-  };
 
   // Counts for `counters`, and takes the random choice of what leaves memory from `seed` on.
   View(CSpace& space, std::string spaceName, Kind kind, CacheCounters& counters, std::uint64_t seed);
@@ -86,6 +78,9 @@ class View {
   // than `expected` is returned all the same.
   ptr<IPersistable> Decode(OID oid, ByteView record, const IPersistable::FnTable* expected = nullptr);
 
+  // Reads a record that Decode has accepted into an object of its class that is in the default state: that cannot fail.
+  void DecodeInto(ptr<IPersistable> object, OID oid, ByteView record);
+
   // The class that a record's head names, read without checking anything; empty where it names none.
   std::string_view ClassInHead(ByteView record) const noexcept;
 
@@ -95,6 +90,8 @@ class View {
   bool Holds(OID oid, const void* self) const;
   // Takes an object in; `commit` is the one that wrote its record, 0 for a new one.
   void Adopt(OID oid, ptr<IPersistable> object, std::uint64_t commit = 0);
+  // Marks an object as the view's own, under that id.
+  void Own(ptr<IPersistable> object, OID oid) noexcept;
   // Removes a resident without ending it.
   void Release(OID oid) noexcept;
   // A resident was marked, or was written by that commit.
@@ -113,32 +110,22 @@ class View {
   const UseCheck& Use() const noexcept { return m_use; }
   const char* UseName() const noexcept { return m_kind == Kind::kSnapshot ? "the snapshot" : "the transaction"; }
 
-  // The root of that name, its map read if need be; null when the space has none.
-  Root* FindRoot(std::string_view name);
-  // Enters a root that the open transaction makes.
-  Root& AddRoot(std::string_view name, const ClassEntry& classEntry, OID oid);
-  // Sets the map of a root to the default state, in place.
-  void ResetInPlace(Root& root) noexcept;
-  // Gives a root in memory another name, under which no root of the space stands.
-  Root& RenameRoot(std::string_view from, std::string_view to);
-  std::map<std::string, Root, std::less<>>& Roots() noexcept { return m_roots; }
+  RootMaps& Roots() noexcept { return m_roots; }
 
   // Ends all residents and sets root maps back to the default state, in place.
   void ForgetResidents() noexcept;
-  // Reads all root maps anew after ForgetResidents; until it has succeeded, Attach tries again.
-  void ReloadRoots();
 
   // The numbers of classes in the view's commit, and those that the open transaction has given out.
   ClassNumbers& Classes() noexcept { return m_classes; }
 
+  const std::string& SpaceName() const noexcept { return m_spaceName; }
   // The message of an exception about object `oid`.
   std::string Describe(OID oid, std::string_view className, std::string_view reason) const;
   ErrorPlace Place(OID oid, std::string_view className = "", std::string_view root = "") const;
 
  private:
   const ClassEntry& ClassOf(OID oid, std::uint32_t number, const IPersistable::FnTable* expected) const;
-  void ReadRoot(std::string_view name, Root& root);
-  void Own(ptr<IPersistable> object, OID oid) noexcept;
+  void ReadBody(ptr<IPersistable> object, ByteView body);
   // Takes all references of the view to these objects back to the unbound state.
   void Unbind(const IdSet& ids) const;
 
@@ -148,14 +135,12 @@ class View {
   mutable std::unique_ptr<EngineSnapshot> m_state;  // an expired state is let go of when it is asked for
   std::function<bool()> m_expiry;
   std::uint64_t m_generation = 0;
-  bool m_rootsAreStale = false;
   ClassNumbers m_classes;
-  mutable std::mutex m_tablesMutex;  // held where the residents or the roots change, for Holds
+  mutable std::mutex m_residentsMutex;  // held where the residents change, for Holds
   Residents m_residents;
   UseCheck m_use;
   CacheCounters& m_counters;
-  std::map<std::string, Root, std::less<>> m_roots;
-  std::vector<Root> m_retiredRoots;  // maps whose name now stands for another class
+  RootMaps m_roots;
 };
 
 // The view in which references are being read on this thread; null outside of View::Decode.
