@@ -4,37 +4,9 @@
 
 #include <utility>
 
-#include "platform/error.h"
-#include "store/envelope.h"
+#include "store/meta.h"
 
 namespace vemo {
-
-namespace {
-
-std::string_view AsText(ByteView bytes) { return {reinterpret_cast<const char*>(bytes.data()), bytes.size()}; }
-
-std::string_view OpenMeta(const std::string& spaceName, std::string_view name, ByteView sealed) {
-  try {
-    return AsText(OpenNamed(NamedTable::kMeta, name, sealed));
-  } catch (const MalformedBytes& malformed) {
-    throw CorruptRecord(spaceName + ": meta value \"" + std::string(name) + "\": " + malformed.what(), {spaceName, "", OID(), "", std::nullopt});
-  }
-}
-
-}  // namespace
-
-std::optional<std::string> ReadMeta(const EngineSnapshot& state, const std::string& spaceName, std::string_view name) {
-  const std::optional<ByteView> sealed = state.ReadNamed(NamedTable::kMeta, name);
-  if (!sealed) return std::nullopt;
-  return std::string(OpenMeta(spaceName, name, *sealed));
-}
-
-void ScanStoredMeta(const EngineSnapshot& state, const std::string& spaceName, std::string_view prefix,
-                    const std::function<bool(std::string_view, std::string_view)>& visit) {
-  state.ScanNamed(NamedTable::kMeta, prefix, [&](std::string_view name, ByteView sealed) {
-    return visit(name, OpenMeta(spaceName, name, sealed));
-  });
-}
 
 Snapshot::Snapshot(CSpace& space, std::string owner)
     : m_space(space),

@@ -78,9 +78,4 @@ class Snapshot {
   View m_view;
 };
 
-// Reading small named values from an engine's state.
-std::optional<std::string> ReadMeta(const EngineSnapshot& state, const std::string& spaceName, std::string_view name);
-void ScanStoredMeta(const EngineSnapshot& state, const std::string& spaceName, std::string_view prefix,
-                    const std::function<bool(std::string_view name, std::string_view value)>& visit);
-
 }  // namespace vemo

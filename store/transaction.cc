@@ -280,43 +280,25 @@ void WriteTransaction::AddRemovedRoots(CommitBatch& batch) const {
 void WriteTransaction::SetMeta(std::string_view name, std::string_view value) {
   RequireOpen();
   CheckName("meta value", name);
-  m_meta.insert_or_assign(std::string(name), std::string(value));
+  m_meta.Set(name, value);
 }
 
 void WriteTransaction::EraseMeta(std::string_view name) {
   RequireOpen();
   CheckName("meta value", name);
-  m_meta.insert_or_assign(std::string(name), std::nullopt);
+  m_meta.Erase(name);
 }
 
 std::optional<std::string> WriteTransaction::Meta(std::string_view name) const {
   RequireOpen();
-  const auto changed = m_meta.find(name);
-  if (changed != m_meta.end()) return changed->second;
+  if (const std::optional<std::string>* changed = m_meta.Find(name)) return *changed;
   return ReadMeta(m_space.m_writerView.State(), m_space.Name(), name);
 }
 
 void WriteTransaction::ScanMeta(std::string_view prefix,
                                 const std::function<bool(std::string_view, std::string_view)>& visit) const {
   RequireOpen();
-  auto changed = m_meta.lower_bound(prefix);
-  bool goOn = true;
-  // Visits the changed values that come before `name`; returns whether `name` itself is one of them.
-  const auto visitChangedUpTo = [&](const std::optional<std::string_view>& name) {
-    while (goOn && changed != m_meta.end() && changed->first.starts_with(prefix) && (!name || changed->first <= *name)) {
-      const bool isName = name && changed->first == *name;
-      if (changed->second) goOn = visit(changed->first, *changed->second);
-      ++changed;
-      if (isName) return true;
-    }
-    return false;
-  };
-  ScanStoredMeta(m_space.m_writerView.State(), m_space.Name(), prefix,
-                 [&](std::string_view name, std::string_view value) {
-                   if (!visitChangedUpTo(name) && goOn) goOn = visit(name, value);
-                   return goOn;
-                 });
-  visitChangedUpTo(std::nullopt);
+  m_meta.Scan(m_space.m_writerView.State(), m_space.Name(), prefix, visit);
 }
 
 // --- What the module tells the store ---
@@ -478,14 +460,7 @@ void WriteTransaction::Commit() {
     }
     for (const OID oid : m_queuedDeletions) batch.queuedDeletions.push_back(oid);
     batch.removedRecords.insert(batch.removedRecords.end(), m_droppedRecords.begin(), m_droppedRecords.end());
-    for (const auto& [name, value] : m_meta) {
-      std::optional<Bytes> sealed;
-      if (value) {
-        const ByteView bytes(reinterpret_cast<const std::uint8_t*>(value->data()), value->size());
-        sealed = SealNamed(NamedTable::kMeta, name, bytes);
-      }
-      batch.namedValues.push_back({NamedTable::kMeta, name, std::move(sealed)});
-    }
+    m_meta.AddTo(batch);
     AddRemovedRoots(batch);
     builder.Finish();
     std::uint64_t generation = view.Generation();

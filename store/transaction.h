@@ -2,7 +2,6 @@
 #pragma once
 
 #include <functional>
-#include <map>
 #include <memory>
 #include <mutex>
 #include <optional>
@@ -12,6 +11,7 @@
 #include <unordered_set>
 #include <vector>
 
+#include "store/meta.h"
 #include "store/space.h"
 #include "vxPersistStore/pref.h"
 
@@ -192,7 +192,7 @@ class WriteTransaction {
   std::size_t m_queueSlice = 256;
   std::vector<RemovedRoot> m_removedRoots;
   std::vector<RenamedRoot> m_renamedRoots;
-  std::map<std::string, std::optional<std::string>, std::less<>> m_meta;  // nothing: erased
+  MetaChanges m_meta;
 };
 
 }  // namespace vemo
