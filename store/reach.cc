@@ -2,6 +2,7 @@
 
 #include "platform/error.h"
 #include "store/commit_builder.h"
+#include "store/names.h"
 #include "vxOperation/src/WorkingSet/CompOp/VectorOT.h"
 
 namespace vemo {
@@ -24,7 +25,7 @@ class DecodedObject {
 
 // As messages name a root.
 std::string RootText(std::string_view name) {
-  if (!name.empty() && name.front() == '\0') return "the owned map " + std::string(name.substr(name.find('/') + 1));
+  if (IsOwnedRootName(name)) return "the owned map " + std::string(name.substr(name.find('/') + 1));
   return "root \"" + std::string(name) + "\"";
 }
 

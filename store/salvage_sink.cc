@@ -42,7 +42,7 @@ void SalvageSink::OpenMap(const std::string& name, OID oid, RawFamily family) {
 
 template <class Map>
 void SalvageSink::OpenMapOfClass() {
-  if (m_name.front() != '\0') {
+  if (!IsOwnedRootName(m_name)) {
     m_map = &Transaction().Root<Map>(m_name);
   } else if (m_restored.insert(m_name).second) {
     m_map = &Transaction().RestoreOwned<Map>(m_oid);

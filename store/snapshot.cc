@@ -5,6 +5,7 @@
 #include <utility>
 
 #include "store/meta.h"
+#include "store/names.h"
 
 namespace vemo {
 
@@ -74,7 +75,7 @@ std::vector<std::string> Snapshot::RootNames() const {
   RequireUse();
   std::vector<std::string> names;
   m_view.State().ScanNamed(NamedTable::kRoots, "", [&](std::string_view name, ByteView) {
-    if (name.front() != '\0') names.emplace_back(name);
+    if (!IsOwnedRootName(name)) names.emplace_back(name);
     return true;
   });
   return names;

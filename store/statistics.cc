@@ -6,6 +6,7 @@
 #include "store/commit_builder.h"
 #include "store/decoded_object.h"
 #include "store/id_set.h"
+#include "store/names.h"
 #include "vxOperation/src/WorkingSet/CompOp/VectorOT.h"
 
 namespace vemo {
@@ -60,7 +61,7 @@ class Collector {
   void AddRoot(const std::string& name) {
     const ptr<IPersistable> object = m_snapshot.RootMap(name);
     MapStatistics map;
-    if (name.front() != '\0') map.root = name;
+    if (!IsOwnedRootName(name)) map.root = name;
     map.className = FindClass(object.Table())->Name();
     map.oid = PersistStateOf(object).m_oid;
     map.recordBytes = Reach(map.oid).size();

@@ -1,7 +1,6 @@
 #include "store/transaction.h"
 
 #include <algorithm>
-#include <set>
 #include <utility>
 
 #include "platform/assertion.h"
@@ -10,6 +9,7 @@
 #include "store/commit_outcome.h"
 #include "store/decoded_object.h"
 #include "store/envelope.h"
+#include "store/names.h"
 #include "store/root_value.h"
 #include "store/snapshot.h"
 
@@ -18,20 +18,6 @@ namespace vemo {
 namespace {
 
 thread_local WriteTransaction* t_transaction = nullptr;
-
-constexpr std::size_t kMaxNameBytes = 400;
-
-void CheckName(std::string_view what, std::string_view name) {
-  if (name.empty() || name.size() > kMaxNameBytes) {
-    throw UsageError("the name of a " + std::string(what) + " has 1 to " + std::to_string(kMaxNameBytes) + " bytes, not " +
-                     std::to_string(name.size()));
-  }
-}
-
-void CheckRootName(std::string_view name) {
-  CheckName("root map", name);
-  if (name.front() == '\0') throw UsageError("the name of a root map cannot start with a zero byte");
-}
 
 // What a stored object owns, read without keeping it; nothing where it cannot be read, since whoever works off the queue of
 // deletions deletes it all the same.
@@ -62,7 +48,7 @@ bool WriteTransaction::IsOpenOnThisThread(const CSpace& space) noexcept {
   return t_transaction != nullptr && &t_transaction->m_space == &space;
 }
 
-WriteTransaction::WriteTransaction(CSpace& space) : m_space(space) {
+WriteTransaction::WriteTransaction(CSpace& space) : m_space(space), m_roots(space.m_writerView, space.Name()) {
   space.RequireThisProcess();
   if (t_transaction != nullptr) {
     throw UsageError(space.Name() + ": this thread has a transaction open; commit or end it before opening another");
@@ -100,9 +86,7 @@ WriteTransaction::~WriteTransaction() {
   if (HasChanges()) {
     view.ForgetResidents();
     try {
-      for (auto renamed = m_renamedRoots.rbegin(); renamed != m_renamedRoots.rend(); ++renamed) {
-        view.Roots().Rename(renamed->to, renamed->from);
-      }
+      m_roots.UndoRenames();
       view.Roots().Reload();
     } catch (const std::exception&) {
       // The roots stay stale, and the next transaction reads them or throws.
@@ -113,7 +97,7 @@ WriteTransaction::~WriteTransaction() {
 
 bool WriteTransaction::HasChanges() const noexcept {
   if (m_space.m_disturbed.exchange(false)) return true;
-  if (m_poisoned || !m_dirty.empty() || !m_new.empty() || !m_deletedIds.empty() || !m_removedRoots.empty()) return true;
+  if (m_poisoned || !m_dirty.empty() || !m_new.empty() || !m_deletedIds.empty() || m_roots.HasRemoved()) return true;
   for (const auto& [name, root] : m_space.m_writerView.Roots().All()) {
     if (!root.committed && !root.oid.IsNull()) return true;
   }
@@ -145,44 +129,17 @@ void WriteTransaction::RequireOpen() const {
 
 // --- Roots ---
 
-// The root of that name as the transaction has left it, which the engine's state does not know yet.
-RootMaps::Root* WriteTransaction::FindAnyRoot(std::string_view name) const {
-  RequireOpen();
-  auto& roots = m_space.m_writerView.Roots().All();
-  const auto found = roots.find(name);
-  if (found != roots.end() && !found->second.oid.IsNull()) return &found->second;
-  return IsRemoved(name) ? nullptr : m_space.m_writerView.Roots().Find(name);
-}
-
-RootMaps::Root* WriteTransaction::FindRootOfClass(std::string_view name, const ClassEntry& classEntry) {
-  RequireOpen();
-  RootMaps::Root* root = FindAnyRoot(name);
-  if (root != nullptr && root->classEntry != &classEntry) {
-    throw UsageError(m_space.Name() + ": root \"" + std::string(name) + "\" is a " +
-                     std::string(root->classEntry->Name()) + ", not a " + std::string(classEntry.Name()));
-  }
-  return root;
-}
-
 void* WriteTransaction::FindExistingRoot(std::string_view name, const IPersistable::FnTable* table) {
-  const RootMaps::Root* root = FindRootOfClass(name, MapClass(table));
-  if (root == nullptr) throw UsageError(m_space.Name() + ": it has no root map \"" + std::string(name) + "\"");
-  return root->map.m_self;
+  RequireOpen();
+  return m_roots.RequireOfClass(name, MapClass(table)).map.m_self;
 }
 
 void* WriteTransaction::FindOrMakeRoot(std::string_view name, const IPersistable::FnTable* table) {
+  RequireOpen();
   CheckRootName(name);
   const ClassEntry& classEntry = MapClass(table);
-  if (const RootMaps::Root* root = FindRootOfClass(name, classEntry)) return root->map.m_self;
-  return MakeRoot(name, classEntry);
-}
-
-void* WriteTransaction::MakeRoot(std::string_view name, const ClassEntry& classEntry) {
+  if (const RootMaps::Root* root = m_roots.FindOfClass(name, classEntry)) return root->map.m_self;
   return m_space.m_writerView.Roots().Add(name, classEntry, m_space.NextId()).map.m_self;
-}
-
-std::string WriteTransaction::OwnedRootName(OID oid) {
-  return std::string("\0owned/", 7) + std::to_string(oid.m_value);
 }
 
 void* WriteTransaction::MakeOwnedRoot(const IPersistable::FnTable* table) {
@@ -200,7 +157,7 @@ void WriteTransaction::ReserveIdsUpTo(OID last) {
 
 void* WriteTransaction::RestoreOwnedRoot(OID oid, const IPersistable::FnTable* table) {
   RequireOpen();
-  if (FindAnyRoot(OwnedRootName(oid)) != nullptr || m_space.m_writerView.State().Read(oid)) {
+  if (m_roots.Find(OwnedRootName(oid)) != nullptr || m_space.m_writerView.State().Read(oid)) {
     throw UsageError(m_space.m_writerView.Describe(oid, "", "the space has an object of that id already"));
   }
   return m_space.m_writerView.Roots().Add(OwnedRootName(oid), MapClass(table), oid).map.m_self;
@@ -218,74 +175,45 @@ OID WriteTransaction::RequireOwnedRoot(ptr<const IPersistable> map) {
 
 std::vector<std::string> WriteTransaction::RootNames() const {
   RequireOpen();
-  std::set<std::string> names;
-  m_space.m_writerView.State().ScanNamed(NamedTable::kRoots, "", [&](std::string_view name, ByteView) {
-    if (name.front() != '\0' && !IsRemoved(name)) names.emplace(name);
-    return true;
-  });
-  for (const auto& [name, root] : m_space.m_writerView.Roots().All()) {
-    if (!root.oid.IsNull() && name.front() != '\0') names.insert(name);
-  }
-  return {names.begin(), names.end()};
-}
-
-bool WriteTransaction::IsRemoved(std::string_view name) const {
-  return std::any_of(m_removedRoots.begin(), m_removedRoots.end(), [name](const auto& root) { return root.name == name; });
+  return m_roots.Names();
 }
 
 void WriteTransaction::RenameRoot(std::string_view from, std::string_view to) {
+  RequireOpen();
   CheckRootName(to);
-  RootMaps::Root* root = FindAnyRoot(from);
-  if (root == nullptr) throw UsageError(m_space.Name() + ": it has no root map \"" + std::string(from) + "\"");
-  if (FindAnyRoot(to) != nullptr) throw UsageError(m_space.Name() + ": it has a root map \"" + std::string(to) + "\" already");
-  m_removedRoots.push_back({std::string(from), OID()});
-  m_renamedRoots.push_back({std::string(from), std::string(to)});
-  m_space.m_writerView.Roots().Rename(from, to).committed = false;
+  m_roots.Rename(from, to);
 }
 
 void WriteTransaction::DeleteRoot(std::string_view name) {
+  RequireOpen();
   CheckRootName(name);
-  if (FindAnyRoot(name) == nullptr) throw UsageError(m_space.Name() + ": it has no root map \"" + std::string(name) + "\"");
   DeleteRootObject(std::string(name));
 }
 
 void WriteTransaction::DeleteRootObject(const std::string& name) {
-  RootMaps::Root& root = *FindAnyRoot(name);
+  RootMaps::Root& root = m_roots.Require(name);
+  const OID oid = root.oid;
   try {
     for (const prefbase& child : OwnedReferences(root.map)) DeleteSubTree(child.Get());
-    m_removedRoots.push_back({name, root.oid});
+    m_roots.Remove(name, root);
   } catch (...) {
     m_poisoned = true;
     throw;
   }
-  m_dirty.erase(root.oid);
-  root.oid = OID();
-  root.committed = false;
-  m_space.m_writerView.Roots().ResetInPlace(root);
-}
-
-void WriteTransaction::AddRemovedRoots(CommitBatch& batch) const {
-  const auto& roots = m_space.m_writerView.Roots().All();
-  for (const RemovedRoot& removed : m_removedRoots) {
-    const auto again = roots.find(removed.name);  // another root may have got the name since
-    if (again == roots.end() || again->second.oid.IsNull()) {
-      batch.namedValues.push_back({NamedTable::kRoots, removed.name, std::nullopt});
-    }
-    if (!removed.oid.IsNull()) batch.removedRecords.push_back(removed.oid);
-  }
+  m_dirty.erase(oid);
 }
 
 // --- Meta ---
 
 void WriteTransaction::SetMeta(std::string_view name, std::string_view value) {
   RequireOpen();
-  CheckName("meta value", name);
+  CheckMetaName(name);
   m_meta.Set(name, value);
 }
 
 void WriteTransaction::EraseMeta(std::string_view name) {
   RequireOpen();
-  CheckName("meta value", name);
+  CheckMetaName(name);
   m_meta.Erase(name);
 }
 
@@ -461,7 +389,7 @@ void WriteTransaction::Commit() {
     for (const OID oid : m_queuedDeletions) batch.queuedDeletions.push_back(oid);
     batch.removedRecords.insert(batch.removedRecords.end(), m_droppedRecords.begin(), m_droppedRecords.end());
     m_meta.AddTo(batch);
-    AddRemovedRoots(batch);
+    m_roots.AddRemovedTo(batch);
     builder.Finish();
     std::uint64_t generation = view.Generation();
     if (!batch.records.empty() || !batch.removedRecords.empty() || !batch.queuedDeletions.empty() ||

@@ -12,6 +12,8 @@
 #include <vector>
 
 #include "store/meta.h"
+#include "store/names.h"
+#include "store/root_changes.h"
 #include "store/space.h"
 #include "vxPersistStore/pref.h"
 
@@ -140,35 +142,19 @@ class WriteTransaction {
     ptr<IPersistable> object;
     bool hasRecord;
   };
-  // A name that is to go, and the record of its map where that goes too.
-  struct RemovedRoot {
-    std::string name;
-    OID oid;
-  };
-  struct RenamedRoot {
-    std::string from;
-    std::string to;
-  };
-
-  static std::string OwnedRootName(OID oid);
   void* FindOrMakeRoot(std::string_view name, const IPersistable::FnTable* table);
   void* FindExistingRoot(std::string_view name, const IPersistable::FnTable* table);
   void* MakeOwnedRoot(const IPersistable::FnTable* table);
   void* RestoreOwnedRoot(OID oid, const IPersistable::FnTable* table);
   OID RequireOwnedRoot(ptr<const IPersistable> map);
   void DeleteRootObject(const std::string& name);
-  RootMaps::Root* FindRootOfClass(std::string_view name, const ClassEntry& classEntry);
-  void* MakeRoot(std::string_view name, const ClassEntry& classEntry);
 
   void DeleteResidents(ptr<IPersistable> root, std::vector<std::vector<OID>>& absent);
   void DeleteResidentsBelow(std::vector<OID> siblings, std::vector<std::vector<OID>>& absent);
   bool HasDirtyNodes() const noexcept;
 
   bool HasChanges() const noexcept;
-  RootMaps::Root* FindAnyRoot(std::string_view name) const;
-  bool IsRemoved(std::string_view name) const;
   void AddChanged(CommitBuilder& builder) const;
-  void AddRemovedRoots(CommitBatch& batch) const;
   void Reattach() noexcept;
   void AfterCommit(std::uint64_t generation, const std::unordered_set<OID>& written) noexcept;
   void Finish() noexcept;
@@ -190,8 +176,7 @@ class WriteTransaction {
   std::vector<OID> m_droppedRecords;                   // unreachable, and not in memory
   // No commit shall pay for a large map that was cleared before it.
   std::size_t m_queueSlice = 256;
-  std::vector<RemovedRoot> m_removedRoots;
-  std::vector<RenamedRoot> m_renamedRoots;
+  RootChanges m_roots;
   MetaChanges m_meta;
 };
 
