@@ -15,7 +15,8 @@ std::string_view OpenMeta(const std::string& spaceName, std::string_view name, B
   try {
     return AsText(OpenNamed(NamedTable::kMeta, name, sealed));
   } catch (const MalformedBytes& malformed) {
-    throw CorruptRecord(spaceName + ": meta value \"" + std::string(name) + "\": " + malformed.what(), {spaceName, "", OID(), "", std::nullopt});
+    throw CorruptRecord(spaceName + ": meta value \"" + std::string(name) + "\": " + malformed.what(),
+                        {spaceName, "", OID(), "", std::nullopt});
   }
 }
 

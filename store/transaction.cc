@@ -1,38 +1,20 @@
 #include "store/transaction.h"
 
-#include <algorithm>
 #include <utility>
 
 #include "platform/assertion.h"
 #include "platform/error.h"
 #include "store/commit_builder.h"
 #include "store/commit_outcome.h"
-#include "store/decoded_object.h"
-#include "store/envelope.h"
 #include "store/names.h"
 #include "store/root_value.h"
-#include "store/snapshot.h"
+#include "store/subtree_deletion.h"
 
 namespace vemo {
 
 namespace {
 
 thread_local WriteTransaction* t_transaction = nullptr;
-
-// What a stored object owns, read without keeping it; nothing where it cannot be read, since whoever works off the queue of
-// deletions deletes it all the same.
-std::optional<std::vector<OID>> ReadOwnedIds(View& view, OID oid) {
-  const std::optional<ByteView> record = view.State().Read(oid);
-  if (!record) return std::nullopt;
-  try {
-    const DecodedObject object(view.Decode(oid, *record));
-    std::vector<OID> ids;
-    for (const prefbase& child : OwnedReferences(object.Get())) ids.push_back(child.m_oid);
-    return ids;
-  } catch (const CorruptRecord&) {
-    return std::nullopt;
-  }
-}
 
 const ClassEntry& MapClass(const IPersistable::FnTable* table) {
   const ClassEntry* entry = FindClass(table);
@@ -48,7 +30,8 @@ bool WriteTransaction::IsOpenOnThisThread(const CSpace& space) noexcept {
   return t_transaction != nullptr && &t_transaction->m_space == &space;
 }
 
-WriteTransaction::WriteTransaction(CSpace& space) : m_space(space), m_roots(space.m_writerView, space.Name()) {
+WriteTransaction::WriteTransaction(CSpace& space)
+    : m_space(space), m_objects(space, space.m_writerView), m_roots(space.m_writerView, space.Name()) {
   space.RequireThisProcess();
   if (t_transaction != nullptr) {
     throw UsageError(space.Name() + ": this thread has a transaction open; commit or end it before opening another");
@@ -97,7 +80,7 @@ WriteTransaction::~WriteTransaction() {
 
 bool WriteTransaction::HasChanges() const noexcept {
   if (m_space.m_disturbed.exchange(false)) return true;
-  if (m_poisoned || !m_dirty.empty() || !m_new.empty() || !m_deletedIds.empty() || m_roots.HasRemoved()) return true;
+  if (m_poisoned || !m_objects.IsEmpty() || m_roots.HasRemoved()) return true;
   for (const auto& [name, root] : m_space.m_writerView.Roots().All()) {
     if (!root.committed && !root.oid.IsNull()) return true;
   }
@@ -106,8 +89,7 @@ bool WriteTransaction::HasChanges() const noexcept {
 
 // Ends what is on the way out and lets go of the locks.
 void WriteTransaction::Finish() noexcept {
-  for (const Deleted& deleted : m_deleted) DestroyObject(deleted.object);
-  m_deleted.clear();
+  m_objects.EndDeleted();
   m_space.TrimWriter();
   m_space.m_writerView.Detach();
   m_space.m_writerView.Use().Unbind();
@@ -165,7 +147,7 @@ void* WriteTransaction::RestoreOwnedRoot(OID oid, const IPersistable::FnTable* t
 
 OID WriteTransaction::RequireOwnedRoot(ptr<const IPersistable> map) {
   RequireOpen();
-  RequireOwn(map);
+  m_objects.RequireOwn(map);
   const OID oid = PersistStateOf(map).m_oid;
   if (m_space.m_writerView.Roots().Find(OwnedRootName(oid)) == nullptr) {
     throw UsageError(m_space.m_writerView.Describe(oid, "", "it is a root with a name, not a map that was made by Own"));
@@ -200,7 +182,7 @@ void WriteTransaction::DeleteRootObject(const std::string& name) {
     m_poisoned = true;
     throw;
   }
-  m_dirty.erase(oid);
+  m_objects.Unmark(oid);
 }
 
 // --- Meta ---
@@ -231,124 +213,37 @@ void WriteTransaction::ScanMeta(std::string_view prefix,
 
 // --- What the module tells the store ---
 
-void WriteTransaction::RequireOwn(ptr<const IPersistable> object) const {
-  m_use.RequireThisProcess(m_space.Name(), "the transaction");
-  const ObjSysState& state = SysStateOf(object);
-  const OID oid = PersistStateOf(object).m_oid;
-  const char* reason = nullptr;
-  if (state.m_cspace != &m_space || state.GetFlag(kSnapshotFlag)) {
-    reason = "it belongs to another space or to a snapshot";
-  } else if (state.GetFlag(kDeletedFlag)) {
-    reason = "it was deleted in this transaction and cannot be changed any more";
-  } else if (oid.IsNull()) {
-    reason = "this root was never committed or is gone; ask the transaction for it by name again";
-  }
-  if (reason != nullptr) throw UsageError(m_space.m_writerView.Describe(oid, "", reason));
-}
+void WriteTransaction::RequireThisProcess() const { m_use.RequireThisProcess(m_space.Name(), "the transaction"); }
 
 void WriteTransaction::TakeNewObject(ptr<IPersistable> object) {
-  OID oid;
   try {
-    m_use.RequireThisProcess(m_space.Name(), "the transaction");
-    oid = m_space.NextId();
-    m_new.insert(oid);
-    m_space.m_writerView.Adopt(oid, object);
+    RequireThisProcess();
+    m_objects.TakeNew(m_space.NextId(), object);
   } catch (...) {
-    if (!oid.IsNull()) m_new.erase(oid);
     DestroyObject(object);
     throw;
   }
 }
 
 void WriteTransaction::MarkDirty(ptr<const IPersistable> object) {
-  RequireOwn(object);
-  m_dirty.emplace(PersistStateOf(object).m_oid, ptr<IPersistable>(object.m_self, object.Table()));
-  SysStateOf(object).SetFlag(ObjSysState::kDirtyFlag);
-  m_space.m_writerView.MarkedDirty(PersistStateOf(object).m_oid);
+  RequireThisProcess();
+  m_objects.MarkDirty(object);
 }
 
 void WriteTransaction::CheckReachable(ptr<const IPersistable> from, ptr<const IPersistable> to) const {
-  if (SysStateOf(from).m_cspace != nullptr) RequireOwn(from);
-  RequireOwn(to);
+  RequireThisProcess();
+  if (SysStateOf(from).m_cspace != nullptr) m_objects.RequireOwn(from);
+  m_objects.RequireOwn(to);
 }
 
-// Takes an object out of the space: at once out of what a commit writes, out of memory when the transaction ends.
 void WriteTransaction::DeleteObject(ptr<IPersistable> object) {
-  RequireOwn(object);
-  const OID oid = PersistStateOf(object).m_oid;
-  m_deletedIds.insert(oid);
-  m_deleted.push_back({oid, object, !m_new.contains(oid)});  // the last step that can throw
-  m_new.erase(oid);
-  m_dirty.erase(oid);
-  m_space.m_writerView.Release(oid);
-  ObjSysState& state = SysStateOf(object);
-  state.ClearFlag(ObjSysState::kDirtyFlag);
-  state.SetFlag(kDeletedFlag);
+  RequireThisProcess();
+  m_objects.Delete(object);
 }
 
-// What is in memory is deleted now, since nodes there may be changed or new; what is not is clean, and its id is queued:
-// later commits delete it a slice at a time.
-//
-// A leaf is also reached along the chain of leaves, and unchanged nodes leave memory before changed ones, so a changed node
-// can be in memory below nodes that are not. While the transaction has changed nodes left, the internal nodes are looked at
-// to see whether it is they that hang there.
 void WriteTransaction::DeleteSubTree(ptr<IPersistable> root) {
-  std::vector<std::vector<OID>> absent;  // children that are not in memory, those of one node together
-  DeleteResidents(root, absent);
-  while (!absent.empty()) {
-    std::vector<OID> siblings = std::move(absent.back());
-    absent.pop_back();
-    m_queuedDeletions.insert(m_queuedDeletions.end(), siblings.begin(), siblings.end());
-    DeleteResidentsBelow(std::move(siblings), absent);
-  }
-}
-
-// Deletes what is in memory below nodes that are not, and that the queue takes with all else below them.
-void WriteTransaction::DeleteResidentsBelow(std::vector<OID> siblings, std::vector<std::vector<OID>>& absent) {
-  vemo::View& view = m_space.m_writerView;
-  std::vector<std::vector<OID>> pending{std::move(siblings)};
-  while (!pending.empty() && HasDirtyNodes()) {
-    const std::vector<OID> nodes = std::move(pending.back());
-    pending.pop_back();
-    for (const OID node : nodes) {
-      const std::optional<std::vector<OID>> children = ReadOwnedIds(view, node);
-      if (!children) continue;
-      if (children->empty()) break;  // a leaf, and so are the others
-      std::vector<OID> missing;
-      for (const OID child : *children) {
-        const ptr<IPersistable> resident = view.Find(child);
-        if (resident.m_self != nullptr) {
-          DeleteResidents(resident, absent);
-        } else if (!m_deletedIds.contains(child)) {
-          missing.push_back(child);
-        }
-      }
-      if (!missing.empty()) pending.push_back(std::move(missing));
-    }
-  }
-}
-
-void WriteTransaction::DeleteResidents(ptr<IPersistable> root, std::vector<std::vector<OID>>& absent) {
-  std::vector<ptr<IPersistable>> pending{root};
-  while (!pending.empty()) {
-    const ptr<IPersistable> object = pending.back();
-    pending.pop_back();
-    std::vector<OID> missing;
-    for (const prefbase& child : OwnedReferences(object)) {
-      const ptr<IPersistable> resident = m_space.m_writerView.Find(child.m_oid);
-      if (resident.m_self != nullptr) {
-        pending.push_back(resident);
-      } else if (!m_deletedIds.contains(child.m_oid)) {
-        missing.push_back(child.m_oid);
-      }
-    }
-    if (!missing.empty()) absent.push_back(std::move(missing));
-    DeleteObject(object);
-  }
-}
-
-bool WriteTransaction::HasDirtyNodes() const noexcept {
-  return std::any_of(m_dirty.begin(), m_dirty.end(), [](const auto& entry) { return !FindClass(entry.second.Table())->isMap; });
+  RequireThisProcess();
+  vemo::DeleteSubTree(m_space.m_writerView, m_objects, root);
 }
 
 // --- Collection ---
@@ -361,9 +256,9 @@ const EngineSnapshot& WriteTransaction::BaseState() const {
 void WriteTransaction::DropUnreachable(OID oid) {
   RequireOpen();
   if (const ptr<IPersistable> resident = m_space.m_writerView.Find(oid); resident.m_self != nullptr) {
-    DeleteObject(resident);
+    m_objects.Delete(resident);
   } else {
-    m_droppedRecords.push_back(oid);
+    m_objects.DropRecord(oid);
   }
 }
 
@@ -378,16 +273,12 @@ void WriteTransaction::Commit() {
   }
   vemo::View& view = m_space.m_writerView;
   const std::size_t classesBefore = view.Classes().Size();
-  CommitBuilder builder(view, m_space, m_new, m_deletedIds);
+  CommitBuilder builder(view, m_space, m_objects.NewIds(), m_objects.DeletedIds());
   CommitBatch& batch = builder.Batch();
   try {
     AddChanged(builder);
     builder.SweepQueue(m_queueSlice);
-    for (const Deleted& deleted : m_deleted) {
-      if (deleted.hasRecord) batch.removedRecords.push_back(deleted.oid);
-    }
-    for (const OID oid : m_queuedDeletions) batch.queuedDeletions.push_back(oid);
-    batch.removedRecords.insert(batch.removedRecords.end(), m_droppedRecords.begin(), m_droppedRecords.end());
+    m_objects.AddRemovedTo(batch);
     m_meta.AddTo(batch);
     m_roots.AddRemovedTo(batch);
     builder.Finish();
@@ -418,9 +309,7 @@ void WriteTransaction::AddChanged(CommitBuilder& builder) const {
     builder.Batch().namedValues.push_back(
         {NamedTable::kRoots, name, EncodeRootValue(name, {std::string(root.classEntry->Name()), root.oid})});
   }
-  for (const auto& [oid, object] : m_dirty) {
-    if (!m_new.contains(oid)) builder.Add(oid, object);
-  }
+  m_objects.AddDirtyTo(builder);
 }
 
 WriteTransaction::DirtySize WriteTransaction::Dirty() const {
@@ -429,7 +318,7 @@ WriteTransaction::DirtySize WriteTransaction::Dirty() const {
   const std::size_t classesBefore = view.Classes().Size();
   DirtySize dirty;
   try {
-    CommitBuilder builder(view, m_space, m_new, m_deletedIds);
+    CommitBuilder builder(view, m_space, m_objects.NewIds(), m_objects.DeletedIds());
     AddChanged(builder);
     for (const CommitBatch::Record& record : builder.Finish().records) {
       ++dirty.objects;
@@ -459,20 +348,10 @@ void WriteTransaction::Reattach() noexcept {
   m_poisoned = true;
 }
 
-// The engine has said yes: what was written is clean, and what no root reaches is dropped.
 void WriteTransaction::AfterCommit(std::uint64_t generation, const std::unordered_set<OID>& written) noexcept {
   vemo::View& view = m_space.m_writerView;
-  for (const auto& [oid, object] : m_dirty) SysStateOf(object).ClearFlag(ObjSysState::kDirtyFlag);
-  for (const OID oid : m_new) {
-    if (written.contains(oid)) continue;
-    const ptr<IPersistable> unreached = view.Find(oid);
-    view.Release(oid);
-    DestroyObject(unreached);
-  }
-  for (const OID oid : written) view.Written(oid, generation);
+  m_objects.Committed(generation, written);
   for (auto& [name, root] : view.Roots().All()) root.committed = !root.oid.IsNull();
-  m_dirty.clear();
-  m_new.clear();
   view.Advance(generation);
   Finish();
 }

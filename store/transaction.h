@@ -7,12 +7,12 @@
 #include <optional>
 #include <string>
 #include <string_view>
-#include <unordered_map>
 #include <unordered_set>
 #include <vector>
 
 #include "store/meta.h"
 #include "store/names.h"
+#include "store/object_changes.h"
 #include "store/root_changes.h"
 #include "store/space.h"
 #include "vxPersistStore/pref.h"
@@ -137,11 +137,6 @@ class WriteTransaction {
   }
 
  private:
-  struct Deleted {
-    OID oid;
-    ptr<IPersistable> object;
-    bool hasRecord;
-  };
   void* FindOrMakeRoot(std::string_view name, const IPersistable::FnTable* table);
   void* FindExistingRoot(std::string_view name, const IPersistable::FnTable* table);
   void* MakeOwnedRoot(const IPersistable::FnTable* table);
@@ -149,17 +144,13 @@ class WriteTransaction {
   OID RequireOwnedRoot(ptr<const IPersistable> map);
   void DeleteRootObject(const std::string& name);
 
-  void DeleteResidents(ptr<IPersistable> root, std::vector<std::vector<OID>>& absent);
-  void DeleteResidentsBelow(std::vector<OID> siblings, std::vector<std::vector<OID>>& absent);
-  bool HasDirtyNodes() const noexcept;
-
   bool HasChanges() const noexcept;
   void AddChanged(CommitBuilder& builder) const;
   void Reattach() noexcept;
   void AfterCommit(std::uint64_t generation, const std::unordered_set<OID>& written) noexcept;
   void Finish() noexcept;
   void RequireOpen() const;
-  void RequireOwn(ptr<const IPersistable> object) const;
+  void RequireThisProcess() const;
 
   CSpace& m_space;
   UseCheck m_use;
@@ -168,14 +159,9 @@ class WriteTransaction {
   bool m_open = false;
   bool m_poisoned = false;
 
-  std::unordered_map<OID, ptr<IPersistable>> m_dirty;  // flagged; new objects among them
-  std::unordered_set<OID> m_new;                       // have no record yet
-  std::vector<Deleted> m_deleted;                      // in memory until the transaction ends
-  std::unordered_set<OID> m_deletedIds;
-  std::vector<OID> m_queuedDeletions;                  // subtrees of which nothing is in memory
-  std::vector<OID> m_droppedRecords;                   // unreachable, and not in memory
   // No commit shall pay for a large map that was cleared before it.
   std::size_t m_queueSlice = 256;
+  ObjectChanges m_objects;
   RootChanges m_roots;
   MetaChanges m_meta;
 };
