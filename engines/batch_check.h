@@ -17,7 +17,8 @@ inline bool IsPossibleName(std::string_view name) noexcept {
   return !name.empty() && name.size() <= kMaxNameBytes;
 }
 
-// Throws UsageError when a name or a value of `batch` is outside the limits of store/engine.h.
+// Throws UsageError when a name or a value of `batch` is outside the limits of store/engine.h, or when it puts or removes the
+// record of one object more than once. Costs sorting the ids.
 void CheckBatch(const CommitBatch& batch);
 
 }  // namespace vemo

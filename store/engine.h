@@ -47,7 +47,7 @@ struct CommitBatch {
 
   std::uint64_t expectedGeneration = 0;  // the commit is refused when the engine stands elsewhere
   std::vector<Record> records;           // put, in any order, each id at most once
-  std::vector<OID> removedRecords;       // one that is missing is no error; none that is also in `records`
+  std::vector<OID> removedRecords;       // each at most once, none of `records`; one that is missing is no error
   std::vector<OID> queuedDeletions;      // joins the queue; one that is there already stays once
   std::vector<OID> finishedDeletions;    // leaves the queue; applied before queuedDeletions
   std::vector<NamedValue> namedValues;

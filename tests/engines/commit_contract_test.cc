@@ -118,6 +118,28 @@ TEST_P(CommitContract, RefusesNamesThatAreEmptyOrTooLongAndAppliesNothing) {
   }
 }
 
+void ExpectRefusedAsAWhole(Engine& engine, BatchBuilder& batch) {
+  EXPECT_THROW(engine.Commit(batch.At(0)), UsageError);
+  EXPECT_EQ(NewestContents(engine), Contents());
+}
+
+TEST_P(CommitContract, RefusesABatchThatTouchesTheRecordOfAnObjectTwiceAndAppliesNothing) {
+  BatchBuilder put, putAndRemoved, removed;
+  put.Put(1, "one").Put(2, "two").Put(1, "another");
+  putAndRemoved.Put(1, "one").Put(2, "two").Remove(1);
+  removed.Remove(1).Put(2, "two").Remove(1);
+  ExpectRefusedAsAWhole(engine(), put);
+  ExpectRefusedAsAWhole(engine(), putAndRemoved);
+  ExpectRefusedAsAWhole(engine(), removed);
+}
+
+TEST_P(CommitContract, RefusesALargeBatchThatTouchesTheRecordOfAnObjectTwice) {
+  BatchBuilder batch;
+  for (std::uint64_t oid = 1'000; oid > 0; --oid) batch.Put(oid, "value");
+  batch.Remove(500);
+  ExpectRefusedAsAWhole(engine(), batch);
+}
+
 TEST_P(CommitContract, TheQueueKeepsEachIdOnceInAscendingOrder) {
   BatchBuilder first, second;
   first.Queue(300).Queue(2).Queue(300);
