@@ -7,6 +7,7 @@
 #include "history/recorder.h"
 #include "history/replay.h"
 #include "platform/error.h"
+#include "store/scan.h"
 #include "store/snapshot.h"
 #include "vxUtils/ByteForms.h"
 
@@ -130,6 +131,7 @@ std::optional<std::string> CheckReplay(CSpace& space, EditSource& source,
   source.Replay(texts);
 
   const auto compare = [&](const FinalContent& expected) {
+    snapshot.Trim();  // nothing of the field before is looked at any more
     const VectorInsertions* stored = insertions.rFind(expected.field);
     return Difference(
         expected, stored == nullptr ? Rebuilt() : Rebuild(texts, *stored, tombstones.rFind(expected.field)));
@@ -146,11 +148,11 @@ std::optional<std::string> CheckReplay(CSpace& space, EditSource& source,
   }
   if (source.OnlyField()) return difference;
   // A repository has the space to itself.
-  for (const auto& [field, stored] : insertions) {
-    if (difference) return difference;
-    if (!texts.Fields().contains(field))
+  ScanMap(snapshot, insertions, FieldId(), [&](const FieldId& field, const auto&) {
+    if (!difference && !texts.Fields().contains(field))
       difference = "field " + FieldIdText(field) + " is in the maps, but not in the source";
-  }
+    return !difference;
+  });
   return difference;
 }
 

@@ -49,7 +49,8 @@ ReplayReport Replay(CSpace& space, EditSource& source, const ReplayOptions& opti
 
 // Rebuilds the content of every field of the source from the stored maps and the inserted texts, and compares it with the
 // source's own final content, byte for byte; live elements and, for a repository, fields that are none of the source's
-// differ as well. Returns what differs first, or nothing. Holds the inserted texts in memory.
+// differ as well. Returns what differs first, or nothing. Holds the inserted texts in memory, and of the maps one field on top of a
+// snapshot's share of SpaceOptions::cacheBytes.
 // `progress`, which may be empty, is told how many of the source's edits have been read.
 std::optional<std::string> CheckReplay(CSpace& space, EditSource& source,
                                        const std::function<void(std::uint64_t editsRead)>& progress = {});

@@ -6,11 +6,12 @@
 #include <optional>
 
 #include "history/edit_source.h"
-#include "history/recorder.h"
+#include "history/recorded_maps.h"
 #include "history/replay.h"
 #include "history/source_error.h"
 #include "platform/error.h"
 #include "store/snapshot.h"
+#include "tool/cache_option.h"
 #include "tool/commands.h"
 #include "tool/numbers.h"
 #include "tool/progress_bar.h"
@@ -29,6 +30,7 @@ struct ReplayArguments {
   std::int64_t batch = 10'000;
   bool resume = false;
   bool check = false;
+  std::optional<std::uint64_t> cacheBytes;
 };
 
 std::unique_ptr<EditSource> OpenSource(const ReplayArguments& arguments) {
@@ -45,23 +47,12 @@ std::unique_ptr<EditSource> OpenSource(const ReplayArguments& arguments) {
   return OpenTrace(arguments.file, ParseFieldId(arguments.field), arguments.author);
 }
 
-template <class Map, class Count>
-void PrintMap(Snapshot& snapshot, const char* name, const Count& count) {
-  const Map& map = snapshot.Root<Map>(name);
-  std::uint64_t runs = 0;
-  for (const auto& entry : map) runs += static_cast<std::uint64_t>(count(entry.second));
-  fmt::print("  {:<12} {:>10} {:>10} {:>8} {:>12}\n", name, Grouped(static_cast<std::uint64_t>(map.size())),
-             Grouped(static_cast<std::uint64_t>(map.GetNumNodes())), map.m_height, Grouped(runs));
-}
-
 void PrintMaps(Snapshot& snapshot) {
   fmt::print("  {:<12} {:>10} {:>10} {:>8} {:>12}\n", "map", "fields", "nodes", "height", "runs");
-  PrintMap<FieldIdToVectorInsertionsMap>(snapshot, kInsertionsRoot,
-                                         [](const auto& p) { return p.m_c.size(); });
-  PrintMap<FieldIdToVectorTombstonesMap>(snapshot, kTombstonesRoot,
-                                         [](const auto& p) { return p.m_tombstones.size(); });
-  PrintMap<FieldIdToVectorInsertionsAndDeletionsMap>(
-      snapshot, kHistoryRoot, [](const auto& p) { return p.m_insertions.m_c.size() + p.m_deletions.size(); });
+  for (const RecordedMap& map : MeasureRecordedMaps(snapshot)) {
+    fmt::print("  {:<12} {:>10} {:>10} {:>8} {:>12}\n", map.root, Grouped(map.fields), Grouped(map.nodes), map.height,
+               Grouped(map.runs));
+  }
 }
 
 void PrintReport(const ReplayReport& report, double seconds) {
@@ -110,7 +101,7 @@ ExitCode RunReplay(const ReplayArguments& arguments) {
   if (arguments.batch < 1) throw UsageError("--batch: a batch has at least 1 edit");
   const std::unique_ptr<EditSource> source = OpenSource(arguments);
   const std::uint64_t edits = CountEdits(*source);
-  auto space = CSpace::Open(arguments.store, {.create = true});
+  auto space = CSpace::Open(arguments.store, {.create = true, .cacheBytes = arguments.cacheBytes});
   const auto start = std::chrono::steady_clock::now();
   ReplayReport report;
   {
@@ -130,7 +121,7 @@ ExitCode RunReplay(const ReplayArguments& arguments) {
   const bool reopen = space->Name() != "memory:";
   if (reopen && arguments.check) {
     space.reset();
-    space = CSpace::Open(arguments.store);
+    space = CSpace::Open(arguments.store, {.cacheBytes = arguments.cacheBytes});
   }
   {
     Snapshot snapshot(*space);
@@ -167,6 +158,7 @@ void AddReplayCommand(CLI::App& app, Command& chosen) {
   command->add_flag("--resume", arguments->resume, "Go on after the last edit that the space has recorded");
   command->add_flag("--check", arguments->check,
                     "Open the space anew, rebuild every content from it and compare it with the source");
+  AddCacheOption(*command, arguments->cacheBytes);
   command->footer(
       "Examples:\n"
       "  vemo replay --store lmdb:/tmp/history --git . --check\n"

@@ -29,7 +29,7 @@ TEST_F(HelpTest, OfEachSubcommandHasAnExampleThatBeginsWithIt) {
 TEST_F(HelpTest, OfReplayNamesEveryOptionAndDefault) {
   const std::string help = Vemo({"replay", "--help"}).out;
   for (const char* word : {"--store", "--field", "--author", "--git", "--rev", "--batch", "--resume",
-                           "--check", "10000", "HEAD", "recorded author"}) {
+                           "--check", "--cache-bytes", "10000", "HEAD", "recorded author"}) {
     EXPECT_NE(help.find(word), std::string::npos) << word;
   }
 }
