@@ -1,13 +1,9 @@
 // replay_bench: histories replayed into the maps.
 #include <fmt/core.h>
 
-#include <CLI/CLI.hpp>
 #include <cstdlib>
-#include <exception>
-#include <filesystem>
-#include <string>
 
-#include "bench/common/row_name.h"
+#include "bench/common/bench_program.h"
 #include "bench/replay/generated_repository.h"
 #include "bench/replay/held_source.h"
 #include "bench/replay/replay_job.h"
@@ -27,18 +23,19 @@ fs::path RecordingFile() {
   return fs::path(folder != nullptr ? folder : VEMO_SOURCE_DIR "/../shared/data") / "automerge-paper.json.gz";
 }
 
-void PrintList() {
+std::vector<std::string> List() {
   std::vector<std::string> workloads{kGit};
   if (fs::exists(RecordingFile())) {
     workloads.insert(workloads.begin(), kRecording);
   } else {
     fmt::print(stderr, "{} is not there: the rows of {} are skipped\n", RecordingFile().string(), kRecording);
   }
+  std::vector<std::string> lines;
   for (const std::string& workload : workloads) {
-    fmt::print("{}/vemo", workload);
-    for (const std::string& operation : ReplayOperations()) fmt::print(" {}.{}", workload, operation);
-    fmt::print("\n");
+    std::string& line = lines.emplace_back(workload + "/vemo");
+    for (const std::string& operation : ReplayOperations()) line += " " + workload + "." + operation;
   }
+  return lines;
 }
 
 std::unique_ptr<EditSource> OpenSource(const RowName& name, const fs::path& folder) {
@@ -49,39 +46,22 @@ std::unique_ptr<EditSource> OpenSource(const RowName& name, const fs::path& fold
   return OpenGitHistory(folder / "repository");
 }
 
-int RunRow(const std::string& wanted, const fs::path& folder) {
-  const std::optional<RowName> name = ParseRowName(wanted);
-  if (!name || (name->workload != kRecording && name->workload != kGit) || name->peer != "vemo") {
-    fmt::print(stderr, "replay_bench: there is no job {}; --list prints those there are\n", wanted);
-    return EXIT_FAILURE;
-  }
-  HeldSource source(*OpenSource(*name, folder), name->size);
-  for (Measurement& measurement : RunReplays(source, folder)) {
-    measurement.row = name->workload + "." + measurement.row;
-    fmt::print("{}\n", ToJsonLine(measurement, name->size, name->peer));
-  }
-  return EXIT_SUCCESS;
+std::optional<std::vector<Measurement>> Run(const RowName& job, const fs::path& folder) {
+  if ((job.workload != kRecording && job.workload != kGit) || job.peer != "vemo") return std::nullopt;
+  HeldSource source(*OpenSource(job, folder), job.size);
+  std::vector<Measurement> measured = RunReplays(source, folder);
+  for (Measurement& measurement : measured) measurement.row = job.workload + "." + measurement.row;
+  return measured;
 }
 
 }  // namespace
 
 int main(int argc, char** argv) {
-  CLI::App app("Measures the replay of histories");
-  bool list = false;
-  std::string wanted;
-  std::string folder;
-  app.add_flag("--list", list, "Print the jobs, each as WORKLOAD/PEER and the rows that it reports");
-  app.add_option("--row", wanted, "Run one: WORKLOAD/EDITS/PEER, such as replay.git/10000/vemo");
-  app.add_option("--folder", folder, "An empty folder for the store")->check(CLI::ExistingDirectory);
-  CLI11_PARSE(app, argc, argv);
-  if (list) {
-    PrintList();
-    return EXIT_SUCCESS;
-  }
-  try {
-    return RunRow(wanted, folder);
-  } catch (const std::exception& error) {
-    fmt::print(stderr, "replay_bench: {}: {}\n", wanted, error.what());
-    return EXIT_FAILURE;
-  }
+  return RunBenchProgram({.name = "replay_bench",
+                          .purpose = "Measures the replay of histories; a job's size is its number of edits",
+                          .exampleJob = "replay.git/10000/vemo",
+                          .needsFolder = true,
+                          .list = List,
+                          .run = Run},
+                         argc, argv);
 }

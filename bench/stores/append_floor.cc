@@ -50,8 +50,7 @@ class AppendPeer : public BytesPeer {
 }  // namespace
 
 StoreKind AppendFloor() {
-  return {"append+fdatasync", StoreRole::kFloor, false,
-          [](const StoreSetup& setup) { return std::make_unique<AppendPeer>(setup); }};
+  return MakeStoreKind<AppendPeer>("append+fdatasync", StoreRole::kFloor, false);
 }
 
 }  // namespace vemo::bench

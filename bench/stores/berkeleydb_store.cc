@@ -25,7 +25,7 @@ class BerkeleyDbPeer : public BytesPeer {
  public:
   explicit BerkeleyDbPeer(const StoreSetup& setup) : BytesPeer(setup), m_buffer(4'096) {
     Check(::db_env_create(&m_environment, 0));
-    const std::uint64_t cacheBytes = setup.cacheBytes == 0 ? kAmpleCacheBytes : setup.cacheBytes;
+    const std::uint64_t cacheBytes = setup.CacheBytes();
     Check(m_environment->set_cachesize(m_environment, 0, static_cast<std::uint32_t>(cacheBytes), 1));
     Check(m_environment->set_lg_bsize(m_environment, 4U << 20));
     Check(m_environment->set_lg_max(m_environment, 64U << 20));
@@ -51,7 +51,6 @@ class BerkeleyDbPeer : public BytesPeer {
     m_transaction = nullptr;
     Check(transaction->commit(transaction, DB_TXN_SYNC));
   }
-  void StartReading() override {}
   std::uint64_t Scan() override {
     DBC* cursor = nullptr;
     Check(m_database->cursor(m_database, nullptr, &cursor, DB_CURSOR_BULK));
@@ -97,8 +96,7 @@ class BerkeleyDbPeer : public BytesPeer {
 }  // namespace
 
 StoreKind BerkeleyDbStore() {
-  return {"BerkeleyDB", StoreRole::kStore, true,
-          [](const StoreSetup& setup) { return std::make_unique<BerkeleyDbPeer>(setup); }};
+  return MakeStoreKind<BerkeleyDbPeer>("BerkeleyDB", StoreRole::kStore, true);
 }
 
 }  // namespace vemo::bench

@@ -32,9 +32,6 @@ inline std::uint64_t ScanStep(std::uint64_t sum, std::uint64_t payload) {
   return sum * 31 + payload;
 }
 
-// What the store keeps of the data in memory where nothing else is asked for.
-inline constexpr std::uint64_t kAmpleCacheBytes = 512ULL << 20;
-
 // Payloads are handed over as bytes made beforehand, so that no peer pays for making them, and read in place,
 // so that none pays for decoding them.
 class BytesPeer : public StorePeer {

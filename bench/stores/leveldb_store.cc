@@ -25,7 +25,7 @@ class LevelDbPeer : public BytesPeer {
  public:
   explicit LevelDbPeer(const StoreSetup& setup)
       : BytesPeer(setup),
-        m_cache(leveldb::NewLRUCache(setup.cacheBytes == 0 ? kAmpleCacheBytes : setup.cacheBytes)),
+        m_cache(leveldb::NewLRUCache(setup.CacheBytes())),
         m_filter(leveldb::NewBloomFilterPolicy(10)) {
     leveldb::Options options;
     options.create_if_missing = true;
@@ -40,7 +40,6 @@ class LevelDbPeer : public BytesPeer {
 
   void Begin() override { m_batch.Clear(); }
   void Commit() override { Check(m_database->Write(m_durably, &m_batch)); }
-  void StartReading() override {}
   std::uint64_t Scan() override {
     const std::unique_ptr<leveldb::Iterator> it(m_database->NewIterator(leveldb::ReadOptions()));
     std::uint64_t sum = 0;
@@ -73,8 +72,7 @@ class LevelDbPeer : public BytesPeer {
 }  // namespace
 
 StoreKind LevelDbStore() {
-  return {"LevelDB", StoreRole::kStore, true,
-          [](const StoreSetup& setup) { return std::make_unique<LevelDbPeer>(setup); }};
+  return MakeStoreKind<LevelDbPeer>("LevelDB", StoreRole::kStore, true);
 }
 
 }  // namespace vemo::bench

@@ -84,8 +84,7 @@ class LmdbPeer : public BytesPeer {
 }  // namespace
 
 StoreKind LmdbStore() {
-  return {"LMDB", StoreRole::kStore, false,
-          [](const StoreSetup& setup) { return std::make_unique<LmdbPeer>(setup); }};
+  return MakeStoreKind<LmdbPeer>("LMDB", StoreRole::kStore, false);
 }
 
 }  // namespace vemo::bench

@@ -1,12 +1,7 @@
 // store_bench: stores on disk, one job a process, each phase of it in a process of its own.
 #include <fmt/core.h>
 
-#include <CLI/CLI.hpp>
-#include <cstdlib>
-#include <exception>
-#include <string>
-
-#include "bench/common/row_name.h"
+#include "bench/common/bench_program.h"
 #include "bench/stores/store_job.h"
 
 namespace {
@@ -26,53 +21,38 @@ const std::vector<Workload>& Workloads() {
   return all;
 }
 
-void PrintList() {
+std::vector<std::string> List() {
+  std::vector<std::string> lines;
   for (const Workload& workload : Workloads()) {
     for (const StoreKind& kind : AllStoreKinds()) {
-      fmt::print("store.{}/{}", workload.suffix, kind.peer);
+      std::string& line = lines.emplace_back(fmt::format("store.{}/{}", workload.suffix, kind.peer));
       for (const std::string& operation : StoreJob::Operations(kind))
-        fmt::print(" store.{}.{}", operation, workload.suffix);
-      fmt::print("\n");
+        line += fmt::format(" store.{}.{}", operation, workload.suffix);
     }
   }
+  return lines;
 }
 
-int RunRow(const std::string& wanted, const std::string& folder) {
-  const std::optional<RowName> name = ParseRowName(wanted);
+std::optional<std::vector<Measurement>> Run(const RowName& job, const std::filesystem::path& folder) {
   for (const Workload& workload : Workloads()) {
     for (const StoreKind& kind : AllStoreKinds()) {
-      if (!name || name->workload != "store." + workload.suffix || name->peer != kind.peer) continue;
-      StoreJob job(kind, workload.keys, workload.payload, name->size, folder);
-      for (Measurement& measurement : job.Run()) {
-        measurement.row = "store." + measurement.row + "." + workload.suffix;
-        fmt::print("{}\n", ToJsonLine(measurement, name->size, kind.peer));
-      }
-      return EXIT_SUCCESS;
+      if (job.workload != "store." + workload.suffix || job.peer != kind.peer) continue;
+      std::vector<Measurement> measured = StoreJob(kind, workload.keys, workload.payload, job.size, folder).Run();
+      for (Measurement& measurement : measured) measurement.row = "store." + measurement.row + "." + workload.suffix;
+      return measured;
     }
   }
-  fmt::print(stderr, "store_bench: there is no job {}; --list prints those there are\n", wanted);
-  return EXIT_FAILURE;
+  return std::nullopt;
 }
 
 }  // namespace
 
 int main(int argc, char** argv) {
-  CLI::App app("Measures stores on disk");
-  bool list = false;
-  std::string wanted;
-  std::string folder;
-  app.add_flag("--list", list, "Print the jobs, each as WORKLOAD/PEER and the rows that it reports");
-  app.add_option("--row", wanted, "Run one: WORKLOAD/SIZE/PEER, such as store.clustered.P1/1000000/vemo");
-  app.add_option("--folder", folder, "An empty folder for the store")->check(CLI::ExistingDirectory);
-  CLI11_PARSE(app, argc, argv);
-  if (list) {
-    PrintList();
-    return EXIT_SUCCESS;
-  }
-  try {
-    return RunRow(wanted, folder);
-  } catch (const std::exception& error) {
-    fmt::print(stderr, "store_bench: {}: {}\n", wanted, error.what());
-    return EXIT_FAILURE;
-  }
+  return RunBenchProgram({.name = "store_bench",
+                          .purpose = "Measures stores on disk",
+                          .exampleJob = "store.clustered.P1/1000000/vemo",
+                          .needsFolder = true,
+                          .list = List,
+                          .run = Run},
+                         argc, argv);
 }

@@ -49,7 +49,6 @@ class RocksDbPeer : public BytesPeer {
 
   void Begin() override { m_batch.Clear(); }
   void Commit() override { Check(m_database->Write(m_durably, &m_batch)); }
-  void StartReading() override {}
   std::uint64_t Scan() override {
     const std::unique_ptr<rocksdb::Iterator> it(m_database->NewIterator(rocksdb::ReadOptions()));
     std::uint64_t sum = 0;
@@ -82,8 +81,7 @@ class RocksDbPeer : public BytesPeer {
 }  // namespace
 
 StoreKind RocksDbStore() {
-  return {"RocksDB", StoreRole::kStore, true,
-          [](const StoreSetup& setup) { return std::make_unique<RocksDbPeer>(setup); }};
+  return MakeStoreKind<RocksDbPeer>("RocksDB", StoreRole::kStore, true);
 }
 
 }  // namespace vemo::bench

@@ -14,7 +14,7 @@ class SqlitePeer : public BytesPeer {
  public:
   explicit SqlitePeer(const StoreSetup& setup) : BytesPeer(setup) {
     Check(::sqlite3_open((setup.folder / "db").c_str(), &m_database));
-    const std::uint64_t cacheBytes = setup.cacheBytes == 0 ? kAmpleCacheBytes : setup.cacheBytes;
+    const std::uint64_t cacheBytes = setup.CacheBytes();
     Execute("PRAGMA journal_mode=WAL");
     Execute("PRAGMA synchronous=FULL");
     Execute("PRAGMA cache_size=-" + std::to_string(cacheBytes / 1024));
@@ -101,8 +101,7 @@ class SqlitePeer : public BytesPeer {
 }  // namespace
 
 StoreKind SqliteStore() {
-  return {"SQLite", StoreRole::kStore, true,
-          [](const StoreSetup& setup) { return std::make_unique<SqlitePeer>(setup); }};
+  return MakeStoreKind<SqlitePeer>("SQLite", StoreRole::kStore, true);
 }
 
 }  // namespace vemo::bench

@@ -8,6 +8,7 @@
 #include <memory>
 #include <string>
 #include <string_view>
+#include <utility>
 #include <vector>
 
 #include "platform/field_id.h"
@@ -17,11 +18,17 @@ namespace vemo::bench {
 // The payloads of a job: P1 and P2 of bench/common/entries.h.
 enum class StorePayload { kTombstones, kInsertions };
 
+// What a store keeps of the data in memory where nothing else is asked for.
+inline constexpr std::uint64_t kAmpleCacheBytes = 512ULL << 20;
+
 struct StoreSetup {
   std::filesystem::path folder;  // exists; empty when the store is made
   StorePayload payload = StorePayload::kTombstones;
   // What the peer may keep of the data in memory of its own, in bytes; 0: enough for all of it.
   std::uint64_t cacheBytes = 0;
+
+  // The same where a peer wants a number in any case.
+  std::uint64_t CacheBytes() const { return cacheBytes == 0 ? kAmpleCacheBytes : cacheBytes; }
 };
 
 // One store, opened by its factory and closed by the destructor. Used by one thread. Every commit is durable
@@ -37,8 +44,8 @@ class StorePeer {
   virtual void Erase(const FieldId& key) = 0;
   virtual void Commit() = 0;
 
-  // Reading sees the newest commit at that time; no commit follows.
-  virtual void StartReading() = 0;
+  // Reading sees the newest commit at that time; no commit follows. Does nothing where a peer reads without more ado.
+  virtual void StartReading() {}
   // A number made of the whole payload under `key`; nothing is 0.
   virtual std::uint64_t Find(const FieldId& key) = 0;
   // A number made of all payloads in ascending order of keys.
@@ -54,6 +61,11 @@ struct StoreKind {
   bool hasCache = true;  // obeys StoreSetup::cacheBytes
   std::function<std::unique_ptr<StorePeer>(const StoreSetup&)> open;
 };
+
+template <class Peer>
+StoreKind MakeStoreKind(std::string peer, StoreRole role, bool hasCache) {
+  return {std::move(peer), role, hasCache, [](const StoreSetup& setup) { return std::make_unique<Peer>(setup); }};
+}
 
 StoreKind VemoStore();
 StoreKind AppendFloor();

@@ -25,8 +25,7 @@ class WiredTigerPeer : public BytesPeer {
  public:
   explicit WiredTigerPeer(const StoreSetup& setup) : BytesPeer(setup) {
     // It refuses less than 1 MB, and with little more it rolls transactions of a thousand keys back.
-    const std::uint64_t cacheBytes =
-        setup.cacheBytes == 0 ? kAmpleCacheBytes : std::max<std::uint64_t>(setup.cacheBytes, 10U << 20);
+    const std::uint64_t cacheBytes = std::max<std::uint64_t>(setup.CacheBytes(), 10U << 20);
     const std::string options = "create,cache_size=" + std::to_string(cacheBytes) +
                                 ",log=(enabled=true),transaction_sync=(enabled=true,method=fsync)";
     Check(::wiredtiger_open(setup.folder.c_str(), nullptr, options.c_str(), &m_connection));
@@ -87,8 +86,7 @@ class WiredTigerPeer : public BytesPeer {
 }  // namespace
 
 StoreKind WiredTigerStore() {
-  return {"WiredTiger", StoreRole::kStore, true,
-          [](const StoreSetup& setup) { return std::make_unique<WiredTigerPeer>(setup); }};
+  return MakeStoreKind<WiredTigerPeer>("WiredTiger", StoreRole::kStore, true);
 }
 
 }  // namespace vemo::bench
