@@ -96,7 +96,11 @@ class Recorder {
     const std::string source = NameOf(from), target = NameOf(to);
     const std::lock_guard lock(m_mutex);
     if (source.empty() != target.empty()) Die("a file was moved into the folder or out of it");
-    if (!source.empty()) Put(DiskOp::kRename, source, 0, target.size(), false, target.data());
+    if (source.empty()) return;
+    for (File& file : m_files) {
+      if (file.name == source) file.name = target;
+    }
+    Put(DiskOp::kRename, source, 0, target.size(), false, target.data());
   }
   void Unlinked(const char* path) {
     const std::string name = NameOf(path);
