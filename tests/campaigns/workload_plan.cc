@@ -16,6 +16,8 @@ class Planner {
   Planner(std::uint64_t seed, std::uint64_t keys, Model& model) : m_random(seed), m_keys(keys), m_model(model) {}
 
   std::vector<Step> Run() {
+    // Small commits, one behind another, are what a log takes.
+    if (m_model.commits / 4 % 2 == 1 && !m_model.roots.empty()) return Small();
     if (m_model.roots.size() > 1 && Chance(6)) CopyAssign();
     const std::uint64_t steps = Chance(8) ? 0 : 1 + Draw(5);
     for (std::uint64_t i = 0; i < steps; ++i) AddStep();
@@ -42,6 +44,25 @@ class Planner {
   template <class Table>
   typename Table::iterator Any(Table& table) {
     return std::next(table.begin(), static_cast<std::ptrdiff_t>(Draw(table.size())));
+  }
+
+  std::vector<Step> Small() {
+    for (std::uint64_t i = 1 + Draw(3); i > 0; --i) {
+      const auto root = Any(m_model.roots);
+      auto& entries = root->second.entries;
+      if (entries.empty() || Chance(4)) {
+        SetMeta();
+        continue;
+      }
+      auto entry = entries.lower_bound(1 + Draw(m_keys));
+      if (entry == entries.end()) entry = entries.begin();
+      Step step{Kind::kEdit, root->first, "", root->second.kind};
+      step.first = step.last = entry->first;
+      step.shift = Draw(1'000);
+      entry->second = step.first + step.shift;
+      m_steps.push_back(std::move(step));
+    }
+    return std::move(m_steps);
   }
 
   static void Put(ModelMap& map, const Step& step) {
