@@ -23,48 +23,68 @@ std::uint64_t CommitOf(const TreeCursor& cursor) {
   return FromBigEndian(cursor.Key().data());
 }
 
-// Takes in the blobs from `from` to `last`; `previous` is the one before them, where that is known. Returns the last one there was.
-std::uint64_t TakeIn(ChangeIndex& index, TreeCursor& cursor, std::uint64_t from, std::uint64_t last,
-                     std::optional<std::uint64_t> previous) {
-  for (bool found = cursor.Seek(KeyOf(from)); found; found = cursor.Next()) {
-    const std::uint64_t commit = CommitOf(cursor);
-    if (commit > last) break;
-    const auto damaged = [&] { index.AddDamaged(commit); };
-    try {
-      const ByteView bytes = cursor.Value();
-      const ChangeBlob blob = ParseChangeBlob(bytes, commit);
-      if (previous && blob.previous != *previous) index.AddDamaged(blob.previous);
-      index.Add(commit, blob, bytes.size());
-    } catch (const MalformedBytes&) {
-      damaged();
-    } catch (const DamagedStorage&) {
-      damaged();
-    }
-    previous = commit;
+// `previous` is the commit with changes before this one, 0 where that is not known; `read` gives the changes.
+template <typename Read>
+void TakeIn(ChangeIndex& index, std::uint64_t commit, std::uint64_t previous, const Read& read) {
+  try {
+    const ByteView bytes = read();
+    const ChangeBlob blob = ParseChangeBlob(bytes, commit);
+    if (previous != 0 && blob.previous != previous) index.AddDamaged(blob.previous);
+    index.Add(commit, blob, bytes.size());
+  } catch (const MalformedBytes&) {
+    index.AddDamaged(commit);
+  } catch (const DamagedStorage&) {
+    index.AddDamaged(commit);
   }
-  return previous.value_or(0);
 }
 
-// Takes in what `state`, that of `commit`, keeps, with nobody else at it.
-void Follow(ChangeIndex& index, PageReader& reader, const SpaceState& state, std::uint64_t commit) {
-  const ChangesRange kept = ReadChangesRange(reader, state);
+// Those of data.mdb, as far as they are not known yet.
+void TakeInStored(ChangeIndex& index, PageReader& reader, const KnownState& data) {
+  const ChangesRange& kept = data.numbers.changes;
   const std::uint64_t newest = index.Newest();
-  index.Follow(commit);
-  if (kept.last > newest) {
-    std::uint64_t last = 0;
-    try {
-      TreeCursor cursor(reader, *state.Table(kChangesTable));
-      // What is older than the first that is kept has been written into the records.
-      const bool followsNewest = newest >= kept.first;
-      if (!followsNewest && !cursor.Find(KeyOf(kept.first))) index.AddDamaged(kept.first);
-      last = TakeIn(index, cursor, std::max(newest + 1, kept.first), kept.last,
-                    followsNewest ? std::optional(newest) : std::nullopt);
-    } catch (const DamagedStorage&) {
-      // The blobs from there on are not known, and what the last one makes doubtful covers all that theirs would.
+  if (kept.last <= newest) return;
+  std::uint64_t last = newest >= kept.first ? newest : 0;
+  try {
+    TreeCursor cursor(reader, *data.state->Table(kChangesTable));
+    // What is older than the first that is kept has been written into the records.
+    if (last == 0 && !cursor.Find(KeyOf(kept.first))) index.AddDamaged(kept.first);
+    for (bool found = cursor.Seek(KeyOf(std::max(newest + 1, kept.first))); found; found = cursor.Next()) {
+      const std::uint64_t commit = CommitOf(cursor);
+      if (commit > kept.last) break;
+      TakeIn(index, commit, last, [&] { return cursor.Value(); });
+      last = commit;
     }
-    if (last != kept.last) index.AddDamaged(kept.last);
+  } catch (const DamagedStorage&) {
+    // The blobs from there on are not known, and what the last one makes doubtful covers all that theirs would.
   }
-  if (commit >= newest) index.Drop(kept.first != 0 ? kept.first : commit + 1, commit);
+  if (last != kept.last) index.AddDamaged(kept.last);
+}
+
+// Those of the log, as far as they are not known yet.
+void TakeInLogged(ChangeIndex& index, const LogPosition& log) {
+  for (const std::uint64_t commit : log.tail->Changing(index.Newest(), log.commit)) {
+    if (const std::optional<ByteView> changes = log.tail->Changes(commit)) {
+      TakeIn(index, commit, 0, [&] { return *changes; });
+    } else {
+      index.AddDamaged(commit);
+    }
+  }
+}
+
+// The first commit whose changes are kept in `state`, 0 for none.
+std::uint64_t FirstKept(const CommitState& state) {
+  const std::uint64_t stored = state.data->numbers.changes.first;
+  return stored != 0 || state.log.commit == state.log.tail->base() ? stored : state.log.tail->base() + 1;
+}
+
+// Takes in what `state` keeps, with nobody else at it.
+void Follow(ChangeIndex& index, PageReader& reader, const CommitState& state) {
+  const std::uint64_t newest = index.Newest();
+  index.Follow(state.Commit());
+  TakeInStored(index, reader, *state.data);
+  TakeInLogged(index, state.log);
+  const std::uint64_t first = FirstKept(state);
+  if (state.Commit() >= newest) index.Drop(first != 0 ? first : state.Commit() + 1, state.Commit());
 }
 
 }  // namespace
@@ -80,36 +100,40 @@ StoredRecord ReadStoredRecord(const TreeCursor& cursor) {
   return {commit, value.subspan(kCommitBytes)};
 }
 
-ByteView ReadChanges(PageReader& reader, const SpaceState& state, std::uint64_t commit) {
-  TreeCursor cursor(reader, *state.Table(kChangesTable));
+ByteView ReadChanges(PageReader& reader, const CommitState& state, std::uint64_t commit) {
+  if (commit > state.log.tail->base()) {
+    // A commit that is damaged there is none that the index could have found.
+    return state.log.tail->Changes(commit).value_or(ByteView());
+  }
+  const PageTable& table = *state.data->state->Table(kChangesTable);
+  TreeCursor cursor(reader, table);
   if (cursor.Find(KeyOf(commit))) return cursor.Value();
-  const PageTable& table = *state.Table(kChangesTable);
   reader.Fail(table.root.root, table, ("the changes of commit " + std::to_string(commit) + " are missing").c_str(), {});
 }
 
-void FollowChanges(ChangeIndex& index, PageReader& reader, const SpaceState& state, std::uint64_t commit) {
+void FollowChanges(ChangeIndex& index, PageReader& reader, const CommitState& state) {
   const std::lock_guard following(index.following());
-  Follow(index, reader, state, commit);
+  Follow(index, reader, state);
 }
 
-bool OpenChanges(ChangeIndex& index, PageReader& reader, const SpaceState& state, std::uint64_t commit) {
+bool OpenChanges(ChangeIndex& index, PageReader& reader, const CommitState& state) {
   const std::lock_guard following(index.following());
-  if (!index.Open(commit)) return false;
+  if (!index.Open(state.Commit())) return false;
   try {
-    Follow(index, reader, state, commit);
+    Follow(index, reader, state);
   } catch (...) {
-    index.Close(commit);
+    index.Close(state.Commit());
     throw;
   }
   return true;
 }
 
-ByteView ReadRecord(OID oid, std::uint64_t commit, const TreeCursor& cursor, const ChangeIndex& index, PageReader& reader,
-                    const SpaceState& state, Bytes& changed) {
+ByteView ReadRecord(OID oid, const TreeCursor& cursor, const ChangeIndex& index, PageReader& reader, const CommitState& state,
+                    Bytes& changed) {
   const StoredRecord stored = ReadStoredRecord(cursor);
-  const std::optional<ChangeIndex::Version> version = index.Find(oid, commit);
+  const std::optional<ChangeIndex::Version> version = index.Find(oid, state.Commit());
   const bool isChanged = version && version->commit > stored.commit;
-  if (index.IsInDoubt(isChanged ? version->commit : stored.commit, commit)) {
+  if (index.IsInDoubt(isChanged ? version->commit : stored.commit, state.Commit())) {
     cursor.Fail("changes that may concern a record there are damaged");
   }
   if (!isChanged) return stored.record;

@@ -29,20 +29,24 @@ constexpr const char* kLock = "lock for writing";
 
 void Apply(const CommitBatch& batch, SpaceWriter& writer, ChangeIndex& changes, const SettlingBounds& bounds,
            SettlingRound& round) {
-  const std::uint64_t generation = writer.Numbers().generation;
+  const std::uint64_t generation = writer.state().Commit();
   if (generation != batch.expectedGeneration) throw StaleGeneration(batch.expectedGeneration, generation);
-  FollowChanges(changes, writer.reader(), writer.state(), generation);
+  FollowChanges(changes, writer.reader(), writer.state());
   RecordWriter records(writer, changes, bounds, round);
   records.Write(batch);
+  if (writer.logged()) return;
   round = records.round();
   for (const OID oid : batch.finishedDeletions) writer.Unqueue(oid);
   for (const OID oid : batch.queuedDeletions) writer.Queue(oid);
-  // Of a name that is there more than once the last value counts.
-  std::map<std::pair<NamedTable, std::string_view>, const std::optional<Bytes>*> named;
-  for (const CommitBatch::NamedValue& value : batch.namedValues) named[{value.table, value.name}] = &value.value;
+  // Of a name that is there more than once the last value counts, those of the log being before.
+  std::map<std::pair<NamedTable, std::string_view>, std::optional<ByteView>> named;
+  for (const auto& [name, value] : writer.state().log.tail->Meta(generation)) named[{NamedTable::kMeta, name}] = value;
+  for (const CommitBatch::NamedValue& value : batch.namedValues) {
+    named[{value.table, value.name}] = value.value ? std::optional(ByteView(*value.value)) : std::nullopt;
+  }
   for (const auto& [name, value] : named) {
-    if (*value) {
-      writer.PutNamed(name.first, name.second, **value);
+    if (value) {
+      writer.PutNamed(name.first, name.second, *value);
     } else {
       writer.RemoveNamed(name.first, name.second);
     }
@@ -80,7 +84,7 @@ class LmdbEngine final : public Engine {
     if (count == 0) throw UsageError(Name() + ": at least one id must be reserved");
     OID first;
     m_environment->Write(kReserve, [&](SpaceWriter& writer) {
-      const std::uint64_t next = writer.Numbers().nextId;
+      const std::uint64_t next = writer.NextId();
       if (count > std::numeric_limits<std::uint64_t>::max() - next) {
         throw StoreError(Name() + ": " + std::to_string(count) +
                          " more ids do not exist: the last is 2^64 - 2");
@@ -107,7 +111,7 @@ class LmdbEngine final : public Engine {
       throw LmdbError("measure", Name(), errno);
     }
     constexpr std::uint64_t kBlockBytes = 512;
-    usage.bytes = static_cast<std::uint64_t>(status.st_blocks) * kBlockBytes;
+    usage.bytes = static_cast<std::uint64_t>(status.st_blocks) * kBlockBytes + m_environment->LogBytes();
     return usage;
   }
 

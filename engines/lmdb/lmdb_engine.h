@@ -18,7 +18,8 @@ struct SettlingBounds {
 };
 
 struct LmdbOptions {
-  // The folder of the space. It holds data.mdb, lock.mdb and writer.lock; it must be on a local file system.
+  // The folder of the space, which holds data.mdb, data.seal, commits.log, lock.mdb and writer.lock. It must be on a local
+  // file system.
   std::filesystem::path path;
 
   // Make the space when `path` is absent (its parent must exist) or an empty folder. A creation that was
@@ -47,7 +48,8 @@ struct LmdbOptions {
 // there was not touched), SpaceBusy (it is open in this process already: LMDB cannot open it twice),
 // UsageError, StoreError.
 //
-// - One commit costs two flushes of the disk; opening one snapshot costs a microsecond and blocks nobody.
+// - A commit that only changes records and values of NamedTable::kMeta costs one flush of the disk as long as it fits the log
+//   (commit_log.h), every other one two; opening one snapshot costs a microsecond and blocks nobody.
 // - A snapshot that stays open keeps the pages it sees from being used again: the file grows with every
 // commit.
 // - The address space is enlarged when it is full and no snapshot of this process is open; otherwise the

@@ -8,6 +8,8 @@
 #include <algorithm>
 #include <bit>
 #include <cerrno>
+#include <chrono>
+#include <cstring>
 #include <memory>
 #include <set>
 #include <sstream>
@@ -26,6 +28,11 @@ constexpr std::size_t kPreferredMapBytes = kMiB << 20;
 constexpr std::size_t kSmallestMapBytes = 16 * kMiB;
 constexpr unsigned kMaxReaders = 510;
 constexpr mdb_mode_t kFileMode = 0666;
+// Other processes may commit twice between two steps of a reader, but not again and again.
+constexpr int kMostTries = 1000;
+// For another process in the middle of a commit, until one looks again whether it has done what is to be done, and in all.
+constexpr std::chrono::milliseconds kOneWait(100);
+constexpr std::chrono::milliseconds kLongestWait(5000);
 
 struct AbortTransaction {
   void operator()(MDB_txn* txn) const noexcept { mdb_txn_abort(txn); }
@@ -35,6 +42,8 @@ using Transaction = std::unique_ptr<MDB_txn, AbortTransaction>;
 class CommitLock {
  public:
   explicit CommitLock(SealedSpace& sealed) : m_sealed(sealed) { m_sealed.LockCommits(); }
+  // The caller has locked commits.
+  CommitLock(SealedSpace& sealed, std::adopt_lock_t) noexcept : m_sealed(sealed) {}
   ~CommitLock() { m_sealed.UnlockCommits(); }
   CommitLock(const CommitLock&) = delete;
   CommitLock& operator=(const CommitLock&) = delete;
@@ -71,6 +80,8 @@ void CheckOpened(int code, const std::string& space) {
   }
   CheckLmdb(code, "open", space);
 }
+
+LogBase LogBaseOf(const KnownState& known) { return {known.numbers.generation, known.numbers.log}; }
 
 [[noreturn]] void ThrowUnfinished(const std::string& space) {
   throw SpaceNotFound("cannot open " + space +
@@ -111,7 +122,10 @@ LmdbEnvironment::LmdbEnvironment(const LmdbOptions& options)
 
 LmdbEnvironment::~LmdbEnvironment() {
   if (!IsOwnProcess()) return;
-  if (m_env != nullptr && !m_options.syncEachCommit && !m_options.readOnly) mdb_env_sync(m_env, 1);
+  if (m_env != nullptr && !m_options.syncEachCommit && !m_options.readOnly) {
+    m_log->SyncAll();
+    mdb_env_sync(m_env, 1);
+  }
   Close();
 }
 
@@ -171,11 +185,13 @@ void LmdbEnvironment::Open(std::size_t mapBytes) {
     if (!m_options.syncEachCommit) flags |= MDB_NOSYNC;
     CheckOpened(mdb_env_open(m_env, m_path.c_str(), flags, kFileMode), m_name);
     m_sealed = std::make_unique<SealedSpace>(m_path, m_name, m_options.readOnly, mapBytes);
+    m_log = std::make_unique<CommitLog>(m_path, m_name, m_options.readOnly, m_options.syncEachCommit);
     m_changes = std::make_shared<ChangeIndex>();
     RequireSoundHeader(*m_sealed->file());
     int deadReaders = 0;
     CheckLmdb(mdb_reader_check(m_env, &deadReaders), "open", m_name);
     OpenOrCreateTables();
+    RecoverLog();
     MDB_envinfo info{};
     CheckLmdb(mdb_env_info(m_env, &info), "open", m_name);
     m_mapBytes = info.me_mapsize;
@@ -204,7 +220,9 @@ void LmdbEnvironment::Close() noexcept {
   if (m_env == nullptr) return;
   mdb_env_close(m_env);
   m_env = nullptr;
+  m_log.reset();
   m_sealed.reset();
+  m_onDisk.reset();
 }
 
 void LmdbEnvironment::OpenOrCreateTables() {
@@ -213,10 +231,11 @@ void LmdbEnvironment::OpenOrCreateTables() {
     m_tables = OpenTables(txn.get(), m_name);
     CheckLmdb(mdb_txn_commit(txn.release()), kOperation, m_name);  // keeps the handles
   };
-  Reading reading;
-  CheckLmdb(TryBeginRead(true, reading), kOperation, m_name);
-  Transaction txn(reading.txn);
-  if (!reading.known->state->tables.empty()) {
+  KnownStatePtr known;
+  MDB_txn* begun = nullptr;
+  CheckLmdb(TryBeginKnown(true, begun, known), kOperation, m_name);
+  Transaction txn(begun);
+  if (!known->state->tables.empty()) {
     open(std::move(txn));
     return;
   }
@@ -225,7 +244,7 @@ void LmdbEnvironment::OpenOrCreateTables() {
   const CommitLock lock(*m_sealed);
   txn = Begin(m_env, 0, "make", m_name);
   const std::uint64_t transaction = mdb_txn_id(txn.get());
-  const KnownStatePtr known = m_sealed->RequireWritable(transaction - 1);
+  known = m_sealed->RequireWritable(transaction - 1);
   if (!known->state->tables.empty()) {  // somebody has made it meanwhile
     open(std::move(txn));
     return;
@@ -268,13 +287,28 @@ void LmdbEnvironment::Write(const char* operation, const std::function<void(Spac
     try {
       if (m_env == nullptr) throw LmdbError(operation, m_name, MDB_PANIC);
       const CommitLock lock(*m_sealed);
-      Transaction txn = Begin(m_env, 0, operation, m_name);
-      const std::uint64_t transaction = mdb_txn_id(txn.get());
-      const KnownStatePtr known = m_sealed->RequireWritable(transaction - 1);
-      SpaceWriter writer(txn.get(), m_tables, *known, m_name);
+      Transaction txn;
+      KnownStatePtr known;
+      const auto begin = [&] {
+        txn = Begin(m_env, 0, operation, m_name);
+        known = m_sealed->RequireWritable(mdb_txn_id(txn.get()) - 1);
+        return txn.get();
+      };
+      known = m_sealed->Known(NewestTransaction());
+      if (known == nullptr) begin();
+      const LogBase base = LogBaseOf(*known);
+      const CommitState state{known, m_log->Recover(base, m_sealed->seal())};
+      // Where a meta page of a commit that failed has stayed, another one must be written over it.
+      const bool isNewest = NewestTransaction() == known->state->transaction();
+      CommitLog* const log = isNewest ? m_log.get() : nullptr;
+      SpaceWriter writer([&] { return txn != nullptr ? txn.get() : begin(); }, m_tables, state, log, m_name);
       change(writer);
-      CheckLmdb(mdb_txn_commit(txn.release()), operation, m_name);
-      m_sealed->Committed(transaction);
+      if (writer.logged()) {
+        RequireOnDisk(operation);
+        m_log->Append(operation, base, writer.logged()->commit, std::move(writer.logged()->payload), m_sealed->seal());
+      } else if (txn != nullptr) {
+        CommitTables(txn.release(), base, operation);
+      }
       return;
     } catch (const LmdbError& error) {
       const std::lock_guard state(m_state);
@@ -283,9 +317,77 @@ void LmdbEnvironment::Write(const char* operation, const std::function<void(Spac
   }
 }
 
+void LmdbEnvironment::CommitTables(MDB_txn* begun, const LogBase& before, const char* operation) {
+  Transaction txn(begun);
+  const std::uint64_t transaction = mdb_txn_id(begun);
+  if (before.identity != 0 && m_options.syncEachCommit && !IsOnDisk(CurrentMetaPages())) m_log->SyncName();
+  m_onDisk.reset();
+  CheckLmdb(mdb_txn_commit(txn.release()), operation, m_name);
+  if (m_options.syncEachCommit) m_onDisk = CurrentMetaPages();
+  m_sealed->Committed(transaction);
+  if (const KnownStatePtr known = m_sealed->Known(transaction)) m_log->Begin(before, LogBaseOf(*known), m_sealed->seal());
+}
+
+// A commit in the log is lost with the one that it goes behind: another process may not have synced that, and where one of LMDB
+// fails, what LMDB writes to take it back is not synced either.
+void LmdbEnvironment::RequireOnDisk(const char* operation) {
+  if (!m_options.syncEachCommit) return;
+  const MetaPages pages = CurrentMetaPages();
+  if (IsOnDisk(pages)) return;
+  CheckLmdb(mdb_env_sync(m_env, 1), operation, m_name);
+  m_log->SyncName();
+  m_onDisk = pages;
+}
+
+LmdbEnvironment::MetaPages LmdbEnvironment::CurrentMetaPages() const noexcept {
+  const std::size_t pageBytes = PageBytesOf(*m_sealed->file());
+  return {ReadMetaPage(*m_sealed->file(), 0, pageBytes), ReadMetaPage(*m_sealed->file(), 1, pageBytes)};
+}
+
+bool LmdbEnvironment::IsOnDisk(const MetaPages& pages) const noexcept {
+  return m_onDisk && std::memcmp(m_onDisk->data(), pages.data(), sizeof pages) == 0;
+}
+
+// Of this or another process, as the meta pages tell.
+std::uint64_t LmdbEnvironment::NewestTransaction() const {
+  MDB_envinfo info{};
+  mdb_env_info(m_env, &info);
+  return info.me_last_txnid;
+}
+
+// The newest for which LMDB lets transactions begin, which comes a moment later.
+bool LmdbEnvironment::IsNewestToRead(std::uint64_t transaction) {
+  MDB_txn* begun = nullptr;
+  if (TryBeginTransaction(&begun) != MDB_SUCCESS) return false;
+  return mdb_txn_id(Transaction(begun).get()) == transaction;
+}
+
+// Takes over what processes have left that ended in the middle of a commit. False where another one stays in the middle of
+// it, or has ended in one of LMDB, which the next commit takes over.
+bool LmdbEnvironment::RecoverLog() {
+  KnownStatePtr known;
+  const auto ask = [&] { return m_sealed->Ask(NewestTransaction(), false, known) == SealedSpace::Answer::kKnown; };
+  const auto start = std::chrono::steady_clock::now();
+  while (std::chrono::steady_clock::now() - start < kLongestWait) {
+    if (!ask()) return false;
+    if (!m_log->NeedsRecovery(LogBaseOf(*known), m_sealed->seal())) return true;
+    if (!m_sealed->TryLockCommits(kOneWait)) continue;
+    const CommitLock lock(*m_sealed, std::adopt_lock);
+    if (!ask()) return false;
+    m_log->Recover(LogBaseOf(*known), m_sealed->seal());
+    return true;
+  }
+  return false;
+}
+
+std::uint64_t LmdbEnvironment::LogBytes() {
+  const std::lock_guard lock(m_state);
+  return m_log != nullptr ? m_log->DiskBytes() : 0;
+}
+
 std::uint64_t LmdbEnvironment::CountRecords() {
   const Reading reading = BeginSnapshot();
-  const std::uint64_t records = reading.known->records;
+  const std::uint64_t records = reading.state.data->records;
   EndSnapshot(reading);
   return records;
 }
@@ -325,20 +427,42 @@ int LmdbEnvironment::TryBeginTransaction(MDB_txn** txn) {
 }
 
 // EAGAIN: with `mayWait` it might succeed.
-int LmdbEnvironment::TryBeginRead(bool mayWait, Reading& reading) {
-  // Other processes may commit twice between two steps of a reader, but not again and again.
-  constexpr int kMostTries = 1000;
+int LmdbEnvironment::TryBeginKnown(bool mayWait, MDB_txn*& txn, KnownStatePtr& known) {
   for (int tries = 1;; ++tries) {
     MDB_txn* begun = nullptr;
     const int code = TryBeginTransaction(&begun);
     if (code != MDB_SUCCESS) return code;
-    Transaction txn(begun);
+    Transaction owned(begun);
     const std::uint64_t transaction = mdb_txn_id(begun);
-    const SealedSpace::Answer answer = m_sealed->Ask(transaction, mayWait, reading.known);
+    const SealedSpace::Answer answer = m_sealed->Ask(transaction, mayWait, known);
     if (answer == SealedSpace::Answer::kUnsealed) return EAGAIN;
     if (answer == SealedSpace::Answer::kKnown) {
+      txn = owned.release();
+      return MDB_SUCCESS;
+    }
+    if (tries == kMostTries) m_sealed->ThrowLostCommit(transaction);
+  }
+}
+
+int LmdbEnvironment::TryBeginRead(bool mayWait, Reading& reading) {
+  for (int tries = 1;; ++tries) {
+    MDB_txn* begun = nullptr;
+    const int code = TryBeginKnown(mayWait, begun, reading.state.data);
+    if (code != MDB_SUCCESS) return code;
+    Transaction txn(begun);
+    const std::uint64_t transaction = mdb_txn_id(begun);
+    const CommitLog::Answer answer = m_log->Follow(
+        LogBaseOf(*reading.state.data), m_sealed->seal(), [&] { return IsNewestToRead(transaction); }, reading.state.log);
+    if (answer == CommitLog::Answer::kKnown) {
       reading.txn = txn.release();
       return MDB_SUCCESS;
+    }
+    if (answer == CommitLog::Answer::kInDoubt) {
+      if (!mayWait) return EAGAIN;
+      if (!RecoverLog()) {
+        throw SpaceBusy("cannot read " + m_name + ": whether its last commit was made is not known, and another process " +
+                        "stays in the middle of a commit; try again");
+      }
     }
     if (tries == kMostTries) m_sealed->ThrowLostCommit(transaction);
   }

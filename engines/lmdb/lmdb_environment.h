@@ -11,6 +11,8 @@
 
 #include <sys/types.h>
 
+#include <array>
+#include <chrono>
 #include <cstddef>
 #include <cstdint>
 #include <filesystem>
@@ -22,6 +24,8 @@
 #include <vector>
 
 #include "engines/lmdb/change_index.h"
+#include "engines/lmdb/change_log.h"
+#include "engines/lmdb/commit_log.h"
 #include "engines/lmdb/lmdb_engine.h"
 #include "engines/lmdb/lmdb_layout.h"
 #include "engines/lmdb/sealed_space.h"
@@ -51,7 +55,7 @@ class LmdbEnvironment {
   // A read transaction, and what is known of the commit that it keeps.
   struct Reading {
     MDB_txn* txn = nullptr;
-    KnownStatePtr known;
+    CommitState state;
   };
 
   // The changes that the space keeps beside its records.
@@ -62,10 +66,13 @@ class LmdbEnvironment {
   Reading BeginSnapshot();
   void EndSnapshot(const Reading& reading) noexcept;
 
-  // Runs `change` in a write transaction and commits it; runs it again when the map had to grow. When it or
-  // the commit throws, nothing was applied. Throws DamagedStorage before anything is written where that could
-  // lose data.
+  // Runs `change` and commits what it has changed, in a transaction of LMDB or by the log; runs it again when the map had to
+  // grow. When it or the commit throws, nothing was applied, but for UnknownOutcome. Throws DamagedStorage before anything is
+  // written where that could lose data.
   void Write(const char* operation, const std::function<void(SpaceWriter&)>& change);
+
+  // What the log takes on the disk.
+  std::uint64_t LogBytes();
 
   // The number of records in the newest commit.
   std::uint64_t CountRecords();
@@ -74,6 +81,13 @@ class LmdbEnvironment {
   std::vector<std::int64_t> ReadersElsewhere();
 
  private:
+  // The two below need m_writing, and commits locked.
+  void CommitTables(MDB_txn* begun, const LogBase& before, const char* operation);
+  void RequireOnDisk(const char* operation);
+  using MetaPages = std::array<MetaPage, kMetaPages>;
+  MetaPages CurrentMetaPages() const noexcept;
+  bool IsOnDisk(const MetaPages& pages) const noexcept;
+
   bool IsOwnProcess() const noexcept;
   void ProbeData() const;
   void RequireSoundHeader(PageFile& file) const;
@@ -84,7 +98,11 @@ class LmdbEnvironment {
 
   // The functions below need m_state; those that change the map need m_writing as well.
   int TryBeginTransaction(MDB_txn** txn);
+  int TryBeginKnown(bool mayWait, MDB_txn*& txn, KnownStatePtr& known);
   int TryBeginRead(bool mayWait, Reading& reading);
+  std::uint64_t NewestTransaction() const;
+  bool IsNewestToRead(std::uint64_t transaction);
+  bool RecoverLog();
   Reading BeginReadOrRecover(const char* operation);
   void Recover(int code, const char* operation);
   void Grow(const char* operation);
@@ -102,7 +120,9 @@ class LmdbEnvironment {
   std::mutex m_state;
   MDB_env* m_env = nullptr;
   std::unique_ptr<SealedSpace> m_sealed;  // of the open environment
+  std::unique_ptr<CommitLog> m_log;       // the same
   std::shared_ptr<ChangeIndex> m_changes = std::make_shared<ChangeIndex>();
+  std::optional<MetaPages> m_onDisk;      // those that are known to be, with all below; guarded by m_writing
   LmdbTables m_tables;
   std::size_t m_mapBytes = 0;
   std::size_t m_openSnapshots = 0;

@@ -136,6 +136,7 @@ LmdbTables CreateTables(MDB_txn* txn, const std::string& space) {
   putNumber(kNextIdKey, 1);
   putNumber(kFirstChangesKey, 0);
   putNumber(kLastChangesKey, 0);
+  putNumber(kLogKey, 0);
   return tables;
 }
 
@@ -151,16 +152,12 @@ StoredNumber StoreNumber(std::string_view key, std::uint64_t number) {
   return stored;
 }
 
-std::uint64_t ReadGeneration(PageReader& reader, const SpaceState& state) {
-  return ReadNumber(reader, state, kGenerationKey);
-}
-
 SpaceNumbers ReadNumbers(PageReader& reader, const SpaceState& state) {
-  return {ReadNumber(reader, state, kGenerationKey), ReadNumber(reader, state, kNextIdKey)};
+  return {ReadNumber(reader, state, kGenerationKey),
+          {ReadNumber(reader, state, kFirstChangesKey), ReadNumber(reader, state, kLastChangesKey)},
+          ReadNumber(reader, state, kLogKey)};
 }
 
-ChangesRange ReadChangesRange(PageReader& reader, const SpaceState& state) {
-  return {ReadNumber(reader, state, kFirstChangesKey), ReadNumber(reader, state, kLastChangesKey)};
-}
+std::uint64_t ReadNextId(PageReader& reader, const SpaceState& state) { return ReadNumber(reader, state, kNextIdKey); }
 
 }  // namespace vemo

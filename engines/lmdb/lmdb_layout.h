@@ -12,6 +12,7 @@
 //                "next id"               8 bytes BE, then a checksum
 //                "first changes"         8 bytes BE, then a checksum: the first commit in the table of changes, or 0
 //                "last changes"          8 bytes BE, then a checksum: the last one, or 0
+//                "log"                   8 bytes BE, then a checksum: the identity of commits.log, 0 before there is one
 //
 // A tag is the XXH3-64 of the key, seeded with the XXH3-64 of the table's name, 8 bytes LE: it tells a value that is
 // reached under a wrong key or in a wrong table. A checksum is the XXH3-64 of the bytes before it, seeded with the tag
@@ -42,7 +43,7 @@ struct LmdbTables {
   unsigned system = 0;
 };
 
-inline constexpr std::uint64_t kLayoutNumber = 3;
+inline constexpr std::uint64_t kLayoutNumber = 4;
 inline constexpr int kTableCount = 7;
 inline constexpr std::string_view kRecordsTable = "records";
 inline constexpr std::string_view kChangesTable = "changes";
@@ -64,25 +65,27 @@ LmdbTables OpenTables(MDB_txn* txn, const std::string& space);
 // Makes an empty space in an environment without tables.
 LmdbTables CreateTables(MDB_txn* txn, const std::string& space);
 
-// The numbers of the system table. Throws DamagedStorage when they are missing or not what was written.
-struct SpaceNumbers {
-  std::uint64_t generation = 0;
-  std::uint64_t nextId = 1;
-};
 // The first and the last commit in the table of changes; both 0 where there is none.
 struct ChangesRange {
   std::uint64_t first = 0;
   std::uint64_t last = 0;
 };
-std::uint64_t ReadGeneration(PageReader& reader, const SpaceState& state);
+// The numbers of the system table that all reading starts from.
+struct SpaceNumbers {
+  std::uint64_t generation = 0;
+  ChangesRange changes;
+  std::uint64_t log = 0;
+};
+// They throw DamagedStorage when numbers are missing or not what was written.
 SpaceNumbers ReadNumbers(PageReader& reader, const SpaceState& state);
-ChangesRange ReadChangesRange(PageReader& reader, const SpaceState& state);
+std::uint64_t ReadNextId(PageReader& reader, const SpaceState& state);
 
 // The keys and values of the numbers, as they are stored.
 inline constexpr std::string_view kGenerationKey = "generation";
 inline constexpr std::string_view kNextIdKey = "next id";
 inline constexpr std::string_view kFirstChangesKey = "first changes";
 inline constexpr std::string_view kLastChangesKey = "last changes";
+inline constexpr std::string_view kLogKey = "log";
 using StoredNumber = std::array<std::uint8_t, 16>;
 StoredNumber StoreNumber(std::string_view key, std::uint64_t number);
 

@@ -1,5 +1,6 @@
 #include "engines/lmdb/lmdb_snapshot.h"
 
+#include <map>
 #include <utility>
 
 #include "engines/batch_check.h"
@@ -26,10 +27,9 @@ OID ToOid(const TreeCursor& cursor) {
 LmdbSnapshot::LmdbSnapshot(std::shared_ptr<LmdbEnvironment> environment)
     : m_environment(std::move(environment)),
       m_reading(*m_environment),
-      m_reader(MakeReader(m_reading.Known().file, State(), m_environment->name())),
+      m_reader(MakeReader(State().data->file, *State().data->state, m_environment->name())),
       m_records(m_reader, Table(kRecordsTable)),
-      m_generation(ReadGeneration(m_reader, State())),
-      m_changes(m_environment->changes(), m_reader, State(), m_generation) {}
+      m_changes(m_environment->changes(), m_reader, State()) {}
 
 std::optional<ByteView> LmdbSnapshot::Read(OID oid) const {
   m_environment->RequireOwnProcess(kOperation);
@@ -38,7 +38,7 @@ std::optional<ByteView> LmdbSnapshot::Read(OID oid) const {
 }
 
 ByteView LmdbSnapshot::RecordAt(OID oid, const TreeCursor& cursor, Bytes& changed) const {
-  return ReadRecord(oid, m_generation, cursor, m_changes.Index(), m_reader, State(), changed);
+  return ReadRecord(oid, cursor, m_changes.Index(), m_reader, State(), changed);
 }
 
 void LmdbSnapshot::ScanRecords(OID first, const std::function<bool(OID, ByteView)>& visit) const {
@@ -53,6 +53,10 @@ void LmdbSnapshot::ScanRecords(OID first, const std::function<bool(OID, ByteView
 std::optional<ByteView> LmdbSnapshot::ReadNamed(NamedTable table, std::string_view name) const {
   m_environment->RequireOwnProcess(kOperation);
   if (!IsPossibleName(name)) return std::nullopt;
+  if (table == NamedTable::kMeta) {
+    RequireMetaOfLog();
+    if (const auto logged = State().log.tail->FindMeta(name, Generation())) return *logged;
+  }
   TreeCursor cursor(m_reader, Table(TableNameOf(table)));
   if (!cursor.Find(name)) return std::nullopt;
   return cursor.Value();
@@ -61,11 +65,36 @@ std::optional<ByteView> LmdbSnapshot::ReadNamed(NamedTable table, std::string_vi
 void LmdbSnapshot::ScanNamed(NamedTable table, std::string_view prefix,
                              const std::function<bool(std::string_view, ByteView)>& visit) const {
   if (prefix.size() > kMaxNameBytes) return;
+  std::map<std::string_view, std::optional<ByteView>> logged;
+  if (table == NamedTable::kMeta) {
+    RequireMetaOfLog();
+    logged = State().log.tail->Meta(Generation());
+  }
+  auto next = logged.lower_bound(prefix);
+  // Visits what the log has before `name`.
+  const auto visitLogged = [&](const std::string_view* name) {
+    for (; next != logged.end() && next->first.starts_with(prefix) && (name == nullptr || next->first < *name); ++next) {
+      if (next->second && !visit(next->first, *next->second)) return false;
+    }
+    return true;
+  };
+  bool isEnough = false;
   Scan(TableNameOf(table), prefix, [&](TreeCursor& cursor) {
     // The value first: what is no name of the table must not end the scan.
     const ByteView value = cursor.Value();
-    return cursor.Key().starts_with(prefix) && visit(cursor.Key(), value);
+    const std::string_view name = cursor.Key();
+    if (!name.starts_with(prefix)) return false;
+    isEnough = !visitLogged(&name) || (!logged.contains(name) && !visit(name, value));
+    return !isEnough;
   });
+  if (!isEnough) visitLogged(nullptr);
+}
+
+// A commit of the log that is damaged may have had any of the user's names.
+void LmdbSnapshot::RequireMetaOfLog() const {
+  if (!State().log.tail->HasDamage(Generation())) return;
+  m_reader.Fail(Table(TableNameOf(NamedTable::kMeta)).root.root, Table(TableNameOf(NamedTable::kMeta)),
+                "a commit in commits.log is damaged that may have changed values of it", {});
 }
 
 std::vector<OID> LmdbSnapshot::QueuedDeletions(std::size_t limit) const {
@@ -82,12 +111,12 @@ std::vector<OID> LmdbSnapshot::QueuedDeletions(std::size_t limit) const {
 std::vector<StorageFinding> LmdbSnapshot::CheckStorage() const {
   m_environment->RequireOwnProcess("check");
   std::vector<StorageFinding> findings =
-      CheckPages(m_reading.Known().file, State(), m_environment->name()).findings;
+      CheckPages(State().data->file, *State().data->state, m_environment->name()).findings;
   for (const std::uint64_t commit : m_changes.Index().Damaged()) {
-    if (commit > m_generation) break;
+    if (commit > Generation()) break;
     findings.push_back({"the changes of commit " + std::to_string(commit) + " are damaged", std::nullopt});
   }
-  if (findings.empty() && !m_reading.Known().doubt.empty()) findings.push_back({m_reading.Known().doubt, std::nullopt});
+  if (findings.empty() && !State().data->doubt.empty()) findings.push_back({State().data->doubt, std::nullopt});
   return findings;
 }
 

@@ -22,22 +22,22 @@ class OpenReading {
   OpenReading(const OpenReading&) = delete;
   OpenReading& operator=(const OpenReading&) = delete;
 
-  const KnownState& Known() const noexcept { return *m_reading.known; }
+  const CommitState& State() const noexcept { return m_reading.state; }
 
  private:
   LmdbEnvironment& m_environment;
   const LmdbEnvironment::Reading m_reading;
 };
 
-// Keeps in the index, while this object lives, the changes that a snapshot of `state`, that of `commit`, needs; IsOpen is false where
+// Keeps in the index, while this object lives, the changes that a snapshot of `state` needs; IsOpen is false where
 // they may have been forgotten already. A forked child leaves the index alone, which may have been copied while it was locked.
 class SnapshotChanges {
  public:
-  SnapshotChanges(std::shared_ptr<ChangeIndex> index, PageReader& reader, const SpaceState& state, std::uint64_t commit)
+  SnapshotChanges(std::shared_ptr<ChangeIndex> index, PageReader& reader, const CommitState& state)
       : m_index(std::move(index)),
-        m_commit(commit),
+        m_commit(state.Commit()),
         m_forks(ForkCount()),
-        m_isOpen(OpenChanges(*m_index, reader, state, commit)) {}
+        m_isOpen(OpenChanges(*m_index, reader, state)) {}
   ~SnapshotChanges() {
     if (m_isOpen && m_forks == ForkCount()) m_index->Close(m_commit);
   }
@@ -63,7 +63,7 @@ class LmdbSnapshot final : public EngineSnapshot {
   // Whether it can be read: false for one that was opened while the changes that it needs were forgotten. Open another.
   bool IsCurrent() const noexcept { return m_changes.IsOpen(); }
 
-  std::uint64_t Generation() const override { return m_generation; }
+  std::uint64_t Generation() const override { return State().Commit(); }
   std::optional<ByteView> Read(OID oid) const override;
   void ScanRecords(OID first, const std::function<bool(OID, ByteView)>& visit) const override;
   std::optional<ByteView> ReadNamed(NamedTable table, std::string_view name) const override;
@@ -73,8 +73,9 @@ class LmdbSnapshot final : public EngineSnapshot {
   std::vector<StorageFinding> CheckStorage() const override;
 
  private:
-  const SpaceState& State() const noexcept { return *m_reading.Known().state; }
-  const PageTable& Table(std::string_view name) const noexcept { return *State().Table(name); }
+  const CommitState& State() const noexcept { return m_reading.State(); }
+  const PageTable& Table(std::string_view name) const noexcept { return *State().data->state->Table(name); }
+  void RequireMetaOfLog() const;
   ByteView RecordAt(OID oid, const TreeCursor& cursor, Bytes& changed) const;
   void Scan(std::string_view table, std::string_view first,
             const std::function<bool(TreeCursor&)>& visit) const;
@@ -84,7 +85,6 @@ class LmdbSnapshot final : public EngineSnapshot {
   mutable PageReader m_reader;  // remembers the pages that it has checked
   mutable TreeCursor m_records;
   mutable Bytes m_changed;  // the record that Read has put together last
-  const std::uint64_t m_generation;
   const SnapshotChanges m_changes;
 };
 

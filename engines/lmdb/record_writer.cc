@@ -2,12 +2,12 @@
 
 #include <algorithm>
 #include <cmath>
+#include <map>
 #include <optional>
 #include <utility>
 
 #include "engines/lmdb/change_log.h"
 #include "engines/record_delta.h"
-#include "platform/error.h"
 
 namespace vemo {
 
@@ -18,6 +18,8 @@ constexpr std::size_t kAlwaysShortBytes = 64;
 // The load, of which 1 is the bound, at which a round begins, and how much may come on top until it ends.
 constexpr double kRoundBegins = 0.5;
 constexpr double kRoundAdds = 0.4;
+// How much of a bound the log may have.
+constexpr double kLogMayHold = 0.25;
 // The most that waits, as a part of what the records take, where that is less than the bound, and what may always wait.
 constexpr std::uint64_t kPartOfRecords = 5;
 constexpr std::uint64_t kAlwaysFewBytes = std::uint64_t{1} << 20;
@@ -36,42 +38,63 @@ SettlingBounds BoundsFor(SettlingBounds bounds, const SpaceState& state) {
 RecordWriter::RecordWriter(SpaceWriter& writer, const ChangeIndex& index, const SettlingBounds& bounds, SettlingRound round)
     : m_writer(writer),
       m_index(index),
-      m_bounds(BoundsFor(bounds, writer.state())),
+      m_bounds(BoundsFor(bounds, *writer.state().data->state)),
       m_round(std::move(round)),
-      m_commit(writer.Numbers().generation + 1),
-      m_before(writer.Changes()),
-      m_kept(m_before) {}
+      m_commit(writer.state().Commit() + 1),
+      m_tail(*writer.state().log.tail),
+      m_kept(writer.state().data->numbers.changes) {
+  const std::vector<std::uint64_t> logged = m_tail.Changing(m_tail.base(), m_commit - 1);
+  if (logged.empty()) return;
+  if (m_kept.first == 0) m_kept.first = logged.front();
+  m_kept.last = logged.back();
+}
 
 void RecordWriter::Write(const CommitBatch& batch) {
-  if (m_index.HasDamage()) m_writer.FailChanges("the changes of a commit are damaged, so that nothing may be written");
+  if (m_index.HasDamage() || m_tail.HasDamage(m_commit)) {
+    m_writer.FailChanges("the changes of a commit are damaged, so that nothing may be written");
+  }
   for (const OID oid : batch.removedRecords) m_writer.RemoveRecord(oid);
   // In the order of ids, so that neighbours are written while their page is at hand.
   std::vector<const CommitBatch::Record*> sorted;
   sorted.reserve(batch.records.size());
   for (const CommitBatch::Record& record : batch.records) sorted.push_back(&record);
   std::sort(sorted.begin(), sorted.end(), [](const auto* a, const auto* b) { return a->oid < b->oid; });
-  ChangeBlobBuilder changes(m_commit);
-  for (const CommitBatch::Record* record : sorted) WriteRecord(*record, changes);
-  const std::size_t blobBytes = WriteChanges(changes);
-
   std::vector<OID> touched(batch.removedRecords);
   for (const CommitBatch::Record* record : sorted) touched.push_back(record->oid);
   std::sort(touched.begin(), touched.end());
-  if (std::adjacent_find(touched.begin(), touched.end()) != touched.end()) {
-    throw UsageError("a commit has the record of an object twice, or has and removes it");
+  ChangeBlobBuilder changes(m_commit);
+  for (const CommitBatch::Record* record : sorted) WriteRecord(*record, changes);
+  const Bytes blob = changes.empty() ? Bytes() : changes.Finish(m_kept.last);
+  const ChangeIndex::Load added{blob.size(), blob.empty() ? 0u : 1u, changes.count()};
+  if (TryLog(batch, added, blob)) return;
+
+  if (!blob.empty()) {
+    if (m_kept.first == 0) m_kept.first = m_commit;
+    m_kept.last = m_commit;
   }
-  Settle(touched, blobBytes, changes.count());
-  if (m_kept.first != m_before.first) m_writer.PutFirstChanges(m_kept.first);
-  if (m_kept.last != m_before.last) m_writer.PutLastChanges(m_kept.last);
+  Settle(touched, WithLogged(added));
+  WriteChanges(blob);
 }
 
-std::size_t RecordWriter::WriteChanges(const ChangeBlobBuilder& changes) {
-  if (changes.empty()) return 0;
-  const Bytes blob = changes.Finish(m_kept.last);
-  m_writer.PutChanges(m_commit, blob);
-  m_kept.last = m_commit;
-  if (m_kept.first == 0) m_kept.first = m_commit;
-  return blob.size();
+// The log must not grow so far that the next commit of tables has to settle all at once.
+bool RecordWriter::TryLog(const CommitBatch& batch, const ChangeIndex::Load& added, ByteView blob) {
+  const bool hasDeletions =
+      !batch.removedRecords.empty() || !batch.queuedDeletions.empty() || !batch.finishedDeletions.empty();
+  if (m_hasWhole || hasDeletions || !m_writer.MayLog()) return false;
+  std::map<std::string_view, std::optional<ByteView>> meta;  // of a name that is there more than once the last value counts
+  for (const CommitBatch::NamedValue& named : batch.namedValues) {
+    if (named.table != NamedTable::kMeta) return false;
+    meta[named.name] = named.value ? std::optional(ByteView(*named.value)) : std::nullopt;
+  }
+  if (LoadOf(WithLogged(added)) > kLogMayHold) return false;
+  if (LoadOf(m_index.CurrentLoad()) >= kRoundBegins + kRoundAdds) return false;
+  if (!m_writer.HasLog()) {
+    m_writer.MakeLog();
+    return false;
+  }
+  std::vector<LoggedCommit::MetaValue> values;
+  for (const auto& [name, value] : meta) values.push_back({name, value});
+  return m_writer.Log(m_commit, PayloadOf(blob, values));
 }
 
 void RecordWriter::WriteRecord(const CommitBatch::Record& record, ChangeBlobBuilder& changes) {
@@ -84,6 +107,7 @@ void RecordWriter::WriteRecord(const CommitBatch::Record& record, ChangeBlobBuil
     }
   }
   m_writer.PutRecord(record.oid, m_commit, record.bytes);
+  m_hasWhole = true;
 }
 
 double RecordWriter::LoadOf(const ChangeIndex::Load& load) const noexcept {
@@ -91,17 +115,22 @@ double RecordWriter::LoadOf(const ChangeIndex::Load& load) const noexcept {
   return std::max({part(load.bytes, m_bounds.bytes), part(load.blobs, m_bounds.commits), part(load.records, m_bounds.records)});
 }
 
-// A record that this commit touches is left alone: its new change leads from the record as it is stored.
-void RecordWriter::Settle(const std::vector<OID>& touched, std::size_t blobBytes, std::size_t numChanges) {
+ChangeIndex::Load RecordWriter::WithLogged(const ChangeIndex::Load& added) const {
+  const LogTail::Size logged = m_tail.CurrentSize();
+  return {added.bytes + logged.bytes, added.blobs + logged.commits, added.records + logged.records};
+}
+
+// A record that this commit touches is left alone: its new change leads from the record as it is stored. `added` is what has
+// been added since the last commit of tables.
+void RecordWriter::Settle(const std::vector<OID>& touched, const ChangeIndex::Load& added) {
   if (m_round.records == nullptr) {
     if (LoadOf(m_index.CurrentLoad()) < kRoundBegins) return;
     m_round = {std::make_shared<const std::vector<OID>>(m_index.Records()), 0, m_commit - 1};
   }
   const std::vector<OID>& records = *m_round.records;
-  const double growth = LoadOf({blobBytes, blobBytes > 0 ? 1u : 0u, numChanges});
   // What writers that come and go have left of their rounds adds up, until one of them writes all of it.
   const bool isLate = LoadOf(m_index.CurrentLoad()) >= kRoundBegins + kRoundAdds;
-  const double part = isLate ? 1 : std::min(1.0, growth / kRoundAdds);
+  const double part = isLate ? 1 : std::min(1.0, LoadOf(added) / kRoundAdds);
   const auto slice = static_cast<std::size_t>(std::ceil(static_cast<double>(records.size()) * part));
   const std::size_t end = std::min(records.size(), m_round.next + std::max<std::size_t>(slice, 1));
   for (; m_round.next < end; ++m_round.next) {
@@ -117,7 +146,7 @@ void RecordWriter::SettleRecord(OID oid) {
   const std::optional<ChangeIndex::Version> version = m_index.Find(oid, m_commit - 1);
   if (!stored || !version || version->commit <= stored->commit) return;
   Bytes changed;
-  m_writer.PutRecord(oid, m_commit, m_writer.CurrentRecord(oid, m_commit - 1, m_index, changed));
+  m_writer.PutRecord(oid, m_commit, m_writer.CurrentRecord(oid, m_index, changed));
 }
 
 void RecordWriter::DropBlobs() {
@@ -127,10 +156,22 @@ void RecordWriter::DropBlobs() {
       m_kept.first = commit;
       break;
     }
-    m_writer.RemoveChanges(commit);
+    if (commit <= m_tail.base()) m_writer.RemoveChanges(commit);
   }
   if (m_kept.first == 0) m_kept.last = 0;
   m_round = {};
+}
+
+// Those of the log that are still needed, and `blob`, those of this commit.
+void RecordWriter::WriteChanges(ByteView blob) {
+  for (const std::uint64_t commit : m_tail.Changing(m_tail.base(), m_commit - 1)) {
+    const bool isKept = m_kept.first != 0 && commit >= m_kept.first;
+    if (isKept) m_writer.PutChanges(commit, *m_tail.Changes(commit));
+  }
+  if (!blob.empty()) m_writer.PutChanges(m_commit, blob);
+  const ChangesRange& before = m_writer.state().data->numbers.changes;
+  if (m_kept.first != before.first) m_writer.PutFirstChanges(m_kept.first);
+  if (m_kept.last != before.last) m_writer.PutLastChanges(m_kept.last);
 }
 
 }  // namespace vemo

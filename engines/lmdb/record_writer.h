@@ -32,7 +32,9 @@ class RecordWriter {
   // Writes as the commit after the state that `writer` began with. `index` knows the changes up to there.
   RecordWriter(SpaceWriter& writer, const ChangeIndex& index, const SettlingBounds& bounds, SettlingRound round);
 
-  // Throws DamagedStorage where changes are damaged, also of a record that is to be settled; then nothing may be committed.
+  // Writes the commit to the log where that suffices (SpaceWriter::logged), and else the records and what the log has to the
+  // tables. Throws DamagedStorage where changes are damaged, also of a record that is to be settled; then nothing may be
+  // committed.
   void Write(const CommitBatch& batch);
 
   // The round as it stands once the commit is made.
@@ -40,11 +42,12 @@ class RecordWriter {
 
  private:
   void WriteRecord(const CommitBatch::Record& record, ChangeBlobBuilder& changes);
-  // Returns the number of bytes.
-  std::size_t WriteChanges(const ChangeBlobBuilder& changes);
-  void Settle(const std::vector<OID>& touched, std::size_t blobBytes, std::size_t numChanges);
+  bool TryLog(const CommitBatch& batch, const ChangeIndex::Load& added, ByteView blob);
+  void Settle(const std::vector<OID>& touched, const ChangeIndex::Load& added);
+  void WriteChanges(ByteView blob);
   void SettleRecord(OID oid);
   void DropBlobs();
+  ChangeIndex::Load WithLogged(const ChangeIndex::Load& added) const;
   double LoadOf(const ChangeIndex::Load& load) const noexcept;
 
   SpaceWriter& m_writer;
@@ -52,8 +55,9 @@ class RecordWriter {
   const SettlingBounds m_bounds;
   SettlingRound m_round;
   const std::uint64_t m_commit;
-  const ChangesRange m_before;
-  ChangesRange m_kept;
+  const LogTail& m_tail;
+  ChangesRange m_kept;  // of all changes once the commit is made, those of the log among them
+  bool m_hasWhole = false;  // records are written as a whole
 };
 
 }  // namespace vemo

@@ -1,13 +1,16 @@
 // data.seal: what the newest commits of data.mdb look like, so that damage to what all reading and writing starts from is
 // noticed.
 //
-//   two slots, at byte 0 and at byte 512; that of transaction n is n & 1
+//   four slots, at bytes 0, 512, 1024 and 1536; transaction n is sealed in slot n & 1, the log up to commit n in
+//   slot 2 + (n & 1)
 //   slot, 40 bytes, LE      "vemoseal" | transaction (8) | digest of the roots (8) | digest of the free pages (8) |
 //                           XXH3-64 of the bytes before, seeded with the slot's number (8)
+//   slot of the log         "vemoslog" | the commit that data.mdb is of (8) | the last commit in the log (8) |
+//                           where the log ends (8) | the same checksum
 //
 // It is written behind each commit and not synced, so that a crash may leave it older than the data, torn or missing; it
-// is never newer, unless a commit was lost. Its lock, held in turn by processes that commit, tells whether a seal that is
-// older than the data is about to be written.
+// is never newer, unless a commit was lost. What it says of the log is also how other processes hear of commits there. Its
+// lock, held in turn by processes that commit, tells whether a seal that is older than the data is about to be written.
 #pragma once
 
 #include <array>
@@ -28,6 +31,13 @@ struct CommitSeal {
   }
 };
 
+// How far commits.log goes.
+struct LogSeal {
+  std::uint64_t base = 0;  // the commit that data.mdb is of
+  std::uint64_t last = 0;
+  std::uint64_t end = 0;  // in bytes
+};
+
 class SealFile {
  public:
   // Opens the file where it is there; one that is not, or may not be read, is as good as an empty one for reading. Throws
@@ -39,6 +49,7 @@ class SealFile {
 
   struct Slots {
     std::array<std::optional<CommitSeal>, 2> slots;  // those that are whole
+    std::optional<LogSeal> log;                      // the newest one
     std::optional<CommitSeal> Of(std::uint64_t transaction) const;
     std::uint64_t Newest() const;  // 0 where there is none
   };
@@ -46,20 +57,24 @@ class SealFile {
 
   // False when the disk refuses; then the seal is older than the data, which costs time and no safety.
   bool Write(const CommitSeal& seal) noexcept;
+  bool Write(const LogSeal& seal) noexcept;
 
   // Across processes. Lock makes the file where it is missing, and waits; TryLock returns whether it got the lock, or that
-  // there is no file to lock.
+  // there is no file to lock. One that is made later by another process is found by the next call.
   void Lock();
-  bool TryLock() noexcept;
+  bool TryLock();
   void Unlock() noexcept;
 
  private:
   int Open(int flags) const;
+  int Keep(int opened) const noexcept;
+  int File() const;
+  bool WriteSlot(std::uint64_t number, std::uint64_t magic, const std::array<std::uint64_t, 3>& numbers) noexcept;
 
   const std::filesystem::path m_path;
   const std::string m_space;
   const bool m_readOnly;
-  std::atomic<int> m_file{-1};  // Lock sets it, while others read
+  mutable std::atomic<int> m_file{-1};  // set once the file is there, while others read
 };
 
 }  // namespace vemo

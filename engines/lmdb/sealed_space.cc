@@ -5,7 +5,6 @@
 #include <thread>
 #include <utility>
 
-#include "engines/lmdb/lmdb_layout.h"
 #include "engines/lmdb/space_folder.h"
 #include "engines/lmdb/storage_check.h"
 
@@ -37,7 +36,7 @@ void SealedSpace::ThrowLostCommit(std::uint64_t transaction) const {
         std::to_string(transaction) + ", and " + kSealFile + " knows transaction " +
         std::to_string(m_seal.Read().Newest()) +
         " (a meta page is damaged, or the file is older); restore the space from a backup, whole, or remove " + kSealFile +
-        " to go on with the older commit");
+        " and put an empty file in place of " + kLogFile + " to go on with the older commit");
 }
 
 KnownStatePtr SealedSpace::Remember(KnownStatePtr state) {
@@ -50,7 +49,10 @@ KnownStatePtr SealedSpace::Read(const MetaPage& meta) const {
   auto known = std::make_shared<KnownState>();
   known->file = m_file;
   known->state = ReadState(m_file, meta, m_space);
-  HoldsSpace(m_file, *known->state, m_space);
+  if (HoldsSpace(m_file, *known->state, m_space)) {
+    PageReader reader = MakeReader(m_file, *known->state, m_space);
+    known->numbers = ReadNumbers(reader, *known->state);
+  }
   if (const PageTable* records = known->state->Table(kRecordsTable)) known->records = records->root.entries;
   if (known->state->free == nullptr) known->doubt = known->state->freeFault;
   return known;
@@ -91,7 +93,7 @@ SealedSpace::Answer SealedSpace::Ask(std::uint64_t transaction, bool mayWait, Kn
     if (m_seal.TryLock()) {
       // Nobody is about to write the seal, unless somebody did between the look at it and the lock.
       const SealFile::Slots now = m_seal.Read();
-      if (now.Of(transaction) || now.Newest() > transaction) {
+      if (now.Of(transaction) || now.Newest() > transaction || !ReadMeta(*m_file, transaction)) {
         m_seal.Unlock();
         continue;
       }
@@ -111,6 +113,21 @@ SealedSpace::Answer SealedSpace::Ask(std::uint64_t transaction, bool mayWait, Kn
   }
 }
 
+bool SealedSpace::TryLockCommits(std::chrono::milliseconds timeout) {
+  const auto start = std::chrono::steady_clock::now();
+  while (!m_seal.TryLock()) {
+    if (std::chrono::steady_clock::now() - start > timeout) return false;
+    std::this_thread::sleep_for(kNap);
+  }
+  return true;
+}
+
+KnownStatePtr SealedSpace::Known(std::uint64_t transaction) {
+  const std::lock_guard lock(m_mutex);
+  const bool isKnown = m_known != nullptr && m_known->state->transaction() == transaction && m_known->doubt.empty();
+  return isKnown ? m_known : nullptr;
+}
+
 // With commits locked. Checks all pages of the newest commit, and seals it where it is sound.
 KnownStatePtr SealedSpace::CheckUnsealed(const MetaPage& meta) {
   auto known = std::make_shared<KnownState>(*Read(meta));
@@ -124,7 +141,7 @@ KnownStatePtr SealedSpace::CheckUnsealed(const MetaPage& meta) {
     known->doubt = ToText(report.findings.front());
     if (report.findings.size() > 1) known->doubt += ", and " + std::to_string(report.findings.size() - 1) + " more faults";
   }
-  if (known->doubt.empty()) m_seal.Write({state.transaction(), state.rootsDigest, state.freeDigest});
+  if (known->doubt.empty()) m_seal.Write(CommitSeal{state.transaction(), state.rootsDigest, state.freeDigest});
   return Remember(std::move(known));
 }
 
@@ -142,9 +159,8 @@ std::string SealedSpace::FaultOfOtherMeta(const SpaceState& state) const {
     if (state.Table(kSystemTable) == nullptr || before->Table(kSystemTable) == nullptr) return {};
     PageReader reader = MakeReader(m_file, state, m_space);
     PageReader readerBefore = MakeReader(m_file, *before, m_space);
-    const SpaceNumbers numbers = ReadNumbers(reader, state);
-    const SpaceNumbers numbersBefore = ReadNumbers(readerBefore, *before);
-    if (numbersBefore.generation > numbers.generation || numbersBefore.nextId > numbers.nextId) {
+    if (ReadNumbers(readerBefore, *before).generation > ReadNumbers(reader, state).generation ||
+        ReadNextId(readerBefore, *before) > ReadNextId(reader, state)) {
       return "a newer commit is hidden";
     }
   } catch (const DamagedStorage&) {
@@ -189,7 +205,7 @@ KnownStatePtr SealedSpace::RequireWritable(std::uint64_t transaction) {
   }
   // Its seal could not be written when it was committed. Where the write of the next meta page fails too, LMDB leaves roots of the failed commit under
   // the number of an older one, which only a seal tells from a damaged number.
-  if (!seal) m_seal.Write({transaction, known->state->rootsDigest, known->state->freeDigest});
+  if (!seal) m_seal.Write(CommitSeal{transaction, known->state->rootsDigest, known->state->freeDigest});
   return known;
 }
 
@@ -199,7 +215,7 @@ void SealedSpace::Committed(std::uint64_t transaction) noexcept {
     if (!meta) return;
     const KnownStatePtr known = Remember(Read(*meta));
     if (!known->doubt.empty()) return;
-    m_seal.Write({transaction, known->state->rootsDigest, known->state->freeDigest});
+    m_seal.Write(CommitSeal{transaction, known->state->rootsDigest, known->state->freeDigest});
   } catch (const std::exception&) {
     // What was committed stays so. Whoever reads it next finds it without a seal and checks it.
   }

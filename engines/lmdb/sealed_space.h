@@ -14,12 +14,14 @@
 // Any thread may call.
 #pragma once
 
+#include <chrono>
 #include <cstdint>
 #include <filesystem>
 #include <memory>
 #include <mutex>
 #include <string>
 
+#include "engines/lmdb/lmdb_layout.h"
 #include "engines/lmdb/seal_file.h"
 #include "engines/lmdb/space_state.h"
 
@@ -30,6 +32,7 @@ struct KnownState {
   std::shared_ptr<const SpaceState> state;
   std::string doubt;          // why nothing may be written; empty where all is well
   std::uint64_t records = 0;  // in the commit
+  SpaceNumbers numbers;       // all 0 where there is no space yet
 };
 using KnownStatePtr = std::shared_ptr<const KnownState>;
 
@@ -57,6 +60,13 @@ class SealedSpace {
   // Held while a commit is made, across processes. Waits.
   void LockCommits() { m_seal.Lock(); }
   void UnlockCommits() noexcept { m_seal.Unlock(); }
+  // False when another process stays in the middle of a commit.
+  bool TryLockCommits(std::chrono::milliseconds timeout);
+
+  SealFile& seal() noexcept { return m_seal; }
+
+  // The state of `transaction`, the newest one, if it is known already and nothing forbids to go on from it; else null.
+  KnownStatePtr Known(std::uint64_t transaction);
 
   // The newest state, which the caller is about to change, with commits locked. What LMDB will read at once is read anew,
   // whatever was known. Throws as Ask does, and DamagedStorage where nothing may be written.

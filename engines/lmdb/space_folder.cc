@@ -4,6 +4,8 @@
 #include <sys/stat.h>
 #include <unistd.h>
 
+#include <algorithm>
+#include <array>
 #include <cerrno>
 #include <map>
 #include <mutex>
@@ -20,7 +22,9 @@ namespace {
 namespace fs = std::filesystem;
 
 bool IsOurs(const fs::path& file) {
-  return file == kDataFile || file == kUnfinishedDataFile || file == kReadersFile || file == kWriterLockFile || file == kSealFile;
+  constexpr std::array kNames{kDataFile, kUnfinishedDataFile, kReadersFile, kWriterLockFile,
+                              kSealFile, kLogFile, kUnfinishedLogFile};
+  return std::find(kNames.begin(), kNames.end(), file) != kNames.end();
 }
 
 // The first file in `path` that this engine does not make, or nothing.

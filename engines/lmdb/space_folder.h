@@ -13,6 +13,8 @@ inline constexpr const char* kUnfinishedDataFile = "data.mdb.new";  // of a crea
 inline constexpr const char* kReadersFile = "lock.mdb";
 inline constexpr const char* kWriterLockFile = "writer.lock";
 inline constexpr const char* kSealFile = "data.seal";
+inline constexpr const char* kLogFile = "commits.log";
+inline constexpr const char* kUnfinishedLogFile = "commits.log.new";
 
 enum class FolderContents {
   kNothingYet,  // an absent or empty folder, or what a creation left that ended before there was a data.mdb

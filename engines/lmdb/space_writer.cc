@@ -3,6 +3,7 @@
 #include <lmdb.h>
 
 #include <cstring>
+#include <utility>
 
 #include "engines/lmdb/big_endian.h"
 #include "engines/lmdb/lmdb_error.h"
@@ -33,11 +34,13 @@ SpaceWriter::IdKey::IdKey(OID oid) noexcept {
   std::memcpy(bytes, key.data(), sizeof bytes);
 }
 
-SpaceWriter::SpaceWriter(MDB_txn* txn, const LmdbTables& tables, const KnownState& known, const std::string& space)
-    : m_txn(txn),
-      m_known(known),
+SpaceWriter::SpaceWriter(std::function<MDB_txn*()> begin, const LmdbTables& tables, const CommitState& state, CommitLog* log,
+                         const std::string& space)
+    : m_begin(std::move(begin)),
+      m_state(state),
+      m_log(log),
       m_space(space),
-      m_reader(MakeReader(known.file, *known.state, space)),
+      m_reader(MakeReader(state.data->file, *state.data->state, space)),
       m_records(MakeTable(tables.records, kRecordsTable)),
       m_changes(MakeTable(tables.changes, kChangesTable)),
       m_info(MakeTable(tables.info, TableNameOf(NamedTable::kInfo))),
@@ -47,7 +50,7 @@ SpaceWriter::SpaceWriter(MDB_txn* txn, const LmdbTables& tables, const KnownStat
       m_system(MakeTable(tables.system, kSystemTable)) {}
 
 SpaceWriter::Table SpaceWriter::MakeTable(unsigned handle, std::string_view name) {
-  const PageTable& table = *m_known.state->Table(name);  // a space has all of them: HoldsSpace
+  const PageTable& table = *m_state.data->state->Table(name);  // a space has all of them: HoldsSpace
   return {handle, table, TreeCursor(m_reader, table)};
 }
 
@@ -79,9 +82,19 @@ std::optional<StoredRecord> SpaceWriter::Stored(OID oid) {
   return ReadStoredRecord(m_records.cursor);
 }
 
-ByteView SpaceWriter::CurrentRecord(OID oid, std::uint64_t commit, const ChangeIndex& index, Bytes& changed) {
+ByteView SpaceWriter::CurrentRecord(OID oid, const ChangeIndex& index, Bytes& changed) {
   m_records.cursor.Find(IdKey(oid).text());
-  return ReadRecord(oid, commit, m_records.cursor, index, m_reader, state(), changed);
+  return ReadRecord(oid, m_records.cursor, index, m_reader, m_state, changed);
+}
+
+bool SpaceWriter::Log(std::uint64_t commit, Bytes payload) {
+  if (!m_log->HasRoom(payload.size())) return false;
+  m_logged = {commit, std::move(payload)};
+  return true;
+}
+
+void SpaceWriter::MakeLog() {
+  if (const std::optional<std::uint64_t> identity = m_log->Make()) PutNumber(kLogKey, *identity);
 }
 
 void SpaceWriter::FailChanges(const char* fault) const {
@@ -104,7 +117,7 @@ std::uint8_t* SpaceWriter::Reserve(Table& table, std::string_view key, std::size
   Check(table, key);
   MDB_val k = ToVal(key);
   MDB_val room{bytes, nullptr};
-  CheckLmdb(mdb_put(m_txn, table.handle, &k, &room, MDB_RESERVE), kOperation, m_space);
+  CheckLmdb(mdb_put(Transaction(), table.handle, &k, &room, MDB_RESERVE), kOperation, m_space);
   return static_cast<std::uint8_t*>(room.mv_data);
 }
 
@@ -129,7 +142,7 @@ void SpaceWriter::PutNumber(std::string_view key, std::uint64_t number) {
 void SpaceWriter::Remove(Table& table, std::string_view key) {
   if (Check(table, key)) table.cursor.CheckNeighbours();
   MDB_val k = ToVal(key);
-  const int code = mdb_del(m_txn, table.handle, &k, nullptr);
+  const int code = mdb_del(Transaction(), table.handle, &k, nullptr);
   if (code != MDB_NOTFOUND) CheckLmdb(code, kOperation, m_space);
 }
 

@@ -1,16 +1,18 @@
-// Changes a space within a write transaction of LMDB.
+// Changes a space: by appending to the log, or within a write transaction of LMDB, which begins with the first change of a table.
 //
 // LMDB believes its pages. So before each change the pages are checked that LMDB will read for it, in the state that the
 // transaction began with: the way to the key, the overflow run that is replaced, the neighbours of a leaf that loses an
 // entry. Each page is checked once in a transaction.
 #pragma once
 
+#include <functional>
 #include <memory>
 #include <optional>
 #include <string>
 #include <string_view>
 
 #include "engines/lmdb/change_log.h"
+#include "engines/lmdb/commit_log.h"
 #include "engines/lmdb/lmdb_layout.h"
 #include "engines/lmdb/sealed_space.h"
 #include "engines/lmdb/tree_cursor.h"
@@ -22,22 +24,38 @@ namespace vemo {
 
 const char* TableNameOf(NamedTable table) noexcept;
 
+// A commit that needs no table.
+struct CommitForLog {
+  std::uint64_t commit = 0;
+  Bytes payload;
+};
+
 class SpaceWriter {
  public:
-  // `known` is the state that `txn` began with.
-  SpaceWriter(MDB_txn* txn, const LmdbTables& tables, const KnownState& known, const std::string& space);
+  // Changes `state`, the newest. `begin` begins the transaction, with that state in its tables, and is called at most once.
+  // `log` is null where nothing may go to it.
+  SpaceWriter(std::function<MDB_txn*()> begin, const LmdbTables& tables, const CommitState& state, CommitLog* log,
+              const std::string& space);
 
-  // Of the state that the transaction began with. Throws DamagedStorage.
-  SpaceNumbers Numbers() { return ReadNumbers(m_reader, *m_known.state); }
-
-  ChangesRange Changes() { return ReadChangesRange(m_reader, *m_known.state); }
+  // What the writer began with.
+  const CommitState& state() const noexcept { return m_state; }
   PageReader& reader() noexcept { return m_reader; }
-  const SpaceState& state() const noexcept { return *m_known.state; }
+  std::uint64_t NextId() { return ReadNextId(m_reader, *m_state.data->state); }
 
-  // The record as it was stored, and with its changes as it is, in the state that the transaction began with. The view stays
-  // until that transaction ends, or `changed` does. Throws DamagedStorage.
+  // The record as it was stored, and with its changes as it is, in the state that the writer began with. The view stays
+  // until the writer ends, or `changed` does. Throws DamagedStorage.
   std::optional<StoredRecord> Stored(OID oid);
-  ByteView CurrentRecord(OID oid, std::uint64_t commit, const ChangeIndex& index, Bytes& changed);
+  ByteView CurrentRecord(OID oid, const ChangeIndex& index, Bytes& changed);
+
+  // The commit with that payload, instead of any change of a table; false where the log has no room for it.
+  bool Log(std::uint64_t commit, Bytes payload);
+  // What Log was given.
+  std::optional<CommitForLog>& logged() noexcept { return m_logged; }
+  // Whether there may be a log to write to, and whether there is.
+  bool MayLog() const noexcept { return m_log != nullptr; }
+  bool HasLog() { return MayLog() && m_log->IsUsable({m_state.data->numbers.generation, m_state.data->numbers.log}); }
+  // Makes a log, which commits after this one can use. Where that is not possible they do without.
+  void MakeLog();
   // Throws DamagedStorage about the table of changes.
   [[noreturn]] void FailChanges(const char* fault) const;
 
@@ -70,6 +88,7 @@ class SpaceWriter {
     std::uint8_t bytes[8];
   };
 
+  MDB_txn* Transaction() { return m_txn != nullptr ? m_txn : m_txn = m_begin(); }
   Table MakeTable(unsigned handle, std::string_view name);
   Table& Named(NamedTable table) noexcept;
   bool Check(Table& table, std::string_view key);
@@ -79,8 +98,11 @@ class SpaceWriter {
   void Remove(Table& table, std::string_view key);
   void PutNumber(std::string_view key, std::uint64_t number);
 
-  MDB_txn* m_txn;
-  const KnownState& m_known;
+  const std::function<MDB_txn*()> m_begin;
+  MDB_txn* m_txn = nullptr;
+  const CommitState& m_state;
+  CommitLog* const m_log;
+  std::optional<CommitForLog> m_logged;
   const std::string& m_space;
   PageReader m_reader;
   Table m_records, m_changes, m_info, m_roots, m_meta, m_deletions, m_system;

@@ -124,7 +124,7 @@ class PagesCheck {
     if (m_state.Table(kSystemTable) == nullptr) return;
     try {
       ReadNumbers(m_reader, m_state);
-      ReadChangesRange(m_reader, m_state);
+      ReadNextId(m_reader, m_state);
     } catch (const DamagedStorage& damaged) {
       Find(damaged);
     }

@@ -77,7 +77,12 @@ class FileDamage {
     for (std::size_t i = 0; i < commits; ++i) {
       if (i + 1 == commits) m_older = SpaceFiles::Read(Space());
       const auto engine = OpenLmdbEngine(options);
-      m_model.Commit(*engine, m_random, 1 + m_random() % 80);
+      // Half of the spaces end with commits in the log.
+      if (i % 8 < 4 || commits % 2 == 0) {
+        m_model.Commit(*engine, m_random, 1 + m_random() % 80);
+      } else {
+        m_model.CommitEdits(*engine, m_random, m_random() % 8);
+      }
     }
     m_files = SpaceFiles::Read(Space());
   }

@@ -275,8 +275,40 @@ void SpaceModel::Commit(Engine& engine, std::mt19937_64& random, std::size_t cha
   *this = std::move(next);
 }
 
+// A version with the same letters.
+std::string NextVersion(const std::string& key, const std::string& value) {
+  constexpr std::size_t kHashBytes = 8;
+  const std::size_t digits = value.find(':') + 1;
+  return SealedValue(key, std::stoull(value) + 26, value.size() - digits - kHashBytes);
+}
+
+void SpaceModel::CommitEdits(Engine& engine, std::mt19937_64& random, std::size_t changes) {
+  SpaceModel next = *this;
+  BatchBuilder batch;
+  std::set<std::uint64_t> touched;
+  for (std::size_t i = 0; i < changes && !next.records.empty(); ++i) {
+    auto record = next.records.lower_bound(random() % 1000);
+    if (record == next.records.end()) record = next.records.begin();
+    if (!touched.insert(record->first).second) continue;
+    record->second = NextVersion(IdText(record->first), record->second);
+    batch.Put(record->first, record->second);
+  }
+  const std::string name = "n" + std::to_string(random() % kNames);
+  if (random() % 4 == 0) {
+    next.named.erase({NamedTable::kMeta, name});
+    batch.Unname(NamedTable::kMeta, name);
+  } else {
+    const std::string value = SealedValue(name, random() % 1000, random() % 40);
+    next.named[{NamedTable::kMeta, name}] = value;
+    batch.Name(NamedTable::kMeta, name, value);
+  }
+  next.generation = engine.Commit(batch.At(generation));
+  *this = std::move(next);
+}
+
 SpaceFiles SpaceFiles::Read(const std::filesystem::path& folder) {
-  return {ReadFile(folder / "data.mdb"), ReadFile(folder / "data.seal")};
+  const bool hasLog = std::filesystem::exists(folder / "commits.log");
+  return {ReadFile(folder / "data.mdb"), ReadFile(folder / "data.seal"), hasLog ? ReadFile(folder / "commits.log") : ""};
 }
 
 void SpaceFiles::Write(const std::filesystem::path& folder) const {
@@ -284,9 +316,37 @@ void SpaceFiles::Write(const std::filesystem::path& folder) const {
   std::filesystem::create_directory(folder);
   WriteFile(folder / "data.mdb", data);
   if (!seal.empty()) WriteFile(folder / "data.seal", seal);
+  if (!log.empty()) WriteFile(folder / "commits.log", log);
 }
 
+namespace {
+
+// The seal stays: without it, an entry at the end that is not whole looks like one that was never acknowledged.
+std::string DamageLog(std::string& log, std::mt19937_64& random) {
+  const std::size_t used = log.find_last_not_of('\0') + 1;
+  const std::size_t at = random() % (used + 100);
+  switch (random() % 8) {
+    case 0:
+      log.clear();
+      return "commits.log is missing";
+    case 1:
+      log.resize(at);
+      return "commits.log cut to " + std::to_string(at) + " bytes";
+    case 2: {
+      const std::size_t bytes = std::size_t{1} << random() % 10;
+      log.replace(at, bytes, bytes, '\0');
+      return std::to_string(bytes) + " bytes of commits.log zeroed at " + std::to_string(at);
+    }
+    default:
+      FlipBit(log, at, random() % 8);
+      return "a bit of commits.log at " + std::to_string(at);
+  }
+}
+
+}  // namespace
+
 std::string Damage(SpaceFiles& files, std::mt19937_64& random) {
+  if (!files.log.empty() && random() % 4 == 0) return DamageLog(files.log, random);
   const bool isSealMissing = random() % 4 == 0;
   if (isSealMissing) files.seal.clear();
   const std::string prefix = isSealMissing ? "without a seal, " : "";

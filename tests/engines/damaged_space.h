@@ -22,6 +22,8 @@ struct SpaceModel {
 
   // Commits random changes to `engine` and to the model.
   void Commit(Engine& engine, std::mt19937_64& random, std::size_t changes);
+  // Of what is there already, and few bytes of each record.
+  void CommitEdits(Engine& engine, std::mt19937_64& random, std::size_t changes);
 };
 
 std::string SealedValue(const std::string& key, std::uint64_t version, std::size_t bytes);
@@ -31,6 +33,7 @@ bool IsSealedValue(const std::string& key, const std::string& value);
 struct SpaceFiles {
   std::string data;
   std::string seal;
+  std::string log;
 
   static SpaceFiles Read(const std::filesystem::path& folder);
   void Write(const std::filesystem::path& folder) const;

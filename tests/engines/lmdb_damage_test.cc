@@ -48,7 +48,7 @@ class LmdbDamage : public testing::TestWithParam<std::size_t> {
  protected:
   fs::path space() const { return m_folder.path() / "space"; }
 
-  // A space after `commits` commits.
+  // A space after `commits` commits, and some more in the log where these are many.
   SpaceModel MakeSpace(std::size_t commits, std::mt19937_64& random) const {
     SpaceModel model;
     LmdbOptions options;
@@ -57,6 +57,7 @@ class LmdbDamage : public testing::TestWithParam<std::size_t> {
     options.syncEachCommit = false;
     const auto engine = OpenLmdbEngine(options);
     for (std::size_t i = 0; i < commits; ++i) model.Commit(*engine, random, 1 + random() % 80);
+    for (std::size_t i = 0; i < commits / 4; ++i) model.CommitEdits(*engine, random, 1 + random() % 8);
     return model;
   }
 
@@ -145,7 +146,7 @@ TEST_P(LmdbDamage, PagesAreReadAsLmdbReadsThem) {
   std::mt19937_64 random(TestSeed(11) + GetParam());
   MakeSpace(GetParam(), random);
   const std::vector<std::string> records = Keys(EntriesByLmdb(space(), "records"));
-  const Named meta = EntriesByLmdb(space(), "meta");
+  const Named info = EntriesByLmdb(space(), "info");
   const Named queue = EntriesByLmdb(space(), "deletions");
   const auto engine = OpenAt(space());
   const auto snapshot = engine->OpenSnapshot();
@@ -158,7 +159,7 @@ TEST_P(LmdbDamage, PagesAreReadAsLmdbReadsThem) {
     return true;
   });
   EXPECT_EQ(Keys(found), records);
-  EXPECT_EQ(AllNamed(*snapshot, NamedTable::kMeta), meta);
+  EXPECT_EQ(AllNamed(*snapshot, NamedTable::kInfo), info);
   EXPECT_EQ(Queue(*snapshot, SIZE_MAX).size(), queue.size());
   EXPECT_TRUE(snapshot->CheckStorage().empty());
 }

@@ -23,6 +23,13 @@ inline std::unique_ptr<Engine> OpenAt(const std::filesystem::path& path, bool cr
   return OpenLmdbEngine(options);
 }
 
+// A record of which a few bytes follow from `version`, less than 9,000.
+inline std::string EditedRecord(std::uint64_t oid, std::uint64_t version) {
+  std::string text(500, static_cast<char>('a' + oid));
+  text.replace(100, 4, std::to_string(1000 + version));
+  return text;
+}
+
 // The message of the `E` that `act` throws.
 template <typename E, typename Act>
 std::string MessageOf(Act&& act) {

@@ -6,6 +6,9 @@
 #include <sys/uio.h>
 #include <unistd.h>
 
+#include <filesystem>
+#include <utility>
+
 namespace {
 
 // Of the thread that tests; 0 means that none is to fail.
@@ -23,6 +26,14 @@ bool Fails() noexcept {
   if (t_failed && !t_staysBroken) return false;
   t_failed = true;
   return true;
+}
+
+std::function<int(const vemo::test::WatchedDisk::Write&)> g_afterWrite;
+std::function<void(const std::string&)> g_beforeSync;
+
+std::string NameOf(int file) {
+  std::error_code error;
+  return std::filesystem::read_symlink("/proc/self/fd/" + std::to_string(file), error).filename().string();
 }
 
 // The function of that name behind this one: the system's, or that of a library which watches the disk.
@@ -45,7 +56,12 @@ extern "C" {
 
 ssize_t pwrite(int file, const void* data, size_t size, off_t offset) {
   static const auto next = Next<ssize_t (*)(int, const void*, size_t, off_t)>("pwrite");
-  return FailOr<ssize_t>([&] { return next(file, data, size, offset); });
+  const ssize_t done = FailOr<ssize_t>([&] { return next(file, data, size, offset); });
+  if (done < 0 || !g_afterWrite) return done;
+  const int code = g_afterWrite({NameOf(file), size, offset});
+  if (code == 0) return done;
+  errno = code;
+  return -1;
 }
 ssize_t writev(int file, const iovec* parts, int count) {
   static const auto next = Next<ssize_t (*)(int, const iovec*, int)>("writev");
@@ -53,6 +69,7 @@ ssize_t writev(int file, const iovec* parts, int count) {
 }
 int fdatasync(int file) {
   static const auto next = Next<int (*)(int)>("fdatasync");
+  if (g_beforeSync) g_beforeSync(NameOf(file));
   return FailOr<int>([&] { return next(file); });
 }
 int fsync(int file) {
@@ -75,6 +92,15 @@ FailingDisk::~FailingDisk() {
 }
 bool FailingDisk::HasFailed() const noexcept {
   return t_failed;
+}
+
+WatchedDisk::WatchedDisk(std::function<int(const Write&)> afterWrite, std::function<void(const std::string&)> beforeSync) {
+  g_afterWrite = std::move(afterWrite);
+  g_beforeSync = std::move(beforeSync);
+}
+WatchedDisk::~WatchedDisk() {
+  g_afterWrite = nullptr;
+  g_beforeSync = nullptr;
 }
 
 }  // namespace vemo::test

@@ -2,6 +2,12 @@
 // whole program, those of shared libraries included.
 #pragma once
 
+#include <sys/types.h>
+
+#include <cstddef>
+#include <functional>
+#include <string>
+
 namespace vemo::test {
 
 // While it lives, the `nth` write or sync of this thread (1 is the next one) fails with EIO, and where it is
@@ -15,6 +21,22 @@ class FailingDisk {
   FailingDisk& operator=(const FailingDisk&) = delete;
 
   bool HasFailed() const noexcept;
+};
+
+// While it lives, sees the writes and syncs of all threads. One at a time.
+class WatchedDisk {
+ public:
+  struct Write {
+    std::string file;  // its name without the folder
+    std::size_t size;
+    off_t offset;
+  };
+  // `afterWrite` is called after each pwrite that was done, and returns 0 or the errno with which it is to fail all the same;
+  // `beforeSync` before each fdatasync, with the name of the file.
+  explicit WatchedDisk(std::function<int(const Write&)> afterWrite, std::function<void(const std::string&)> beforeSync = {});
+  ~WatchedDisk();
+  WatchedDisk(const WatchedDisk&) = delete;
+  WatchedDisk& operator=(const WatchedDisk&) = delete;
 };
 
 }  // namespace vemo::test

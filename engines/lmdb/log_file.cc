@@ -1,0 +1,120 @@
+#include "engines/lmdb/log_file.h"
+
+#include <fcntl.h>
+#include <sys/stat.h>
+#include <unistd.h>
+
+#include <algorithm>
+#include <cerrno>
+#include <cstdio>
+#include <exception>
+
+#include "engines/lmdb/lmdb_error.h"
+#include "engines/lmdb/space_folder.h"
+
+namespace vemo {
+
+LogFile::LogFile(const std::filesystem::path& folder, const std::string& space, bool readOnly, bool sync)
+    : m_folder(folder), m_path(folder / kLogFile), m_space(space), m_readOnly(readOnly), m_sync(sync) {}
+
+LogFile::~LogFile() {
+  Replace(-1);
+}
+
+void LogFile::Replace(int file) noexcept {
+  if (m_file >= 0) ::close(m_file);
+  m_file = file;
+}
+
+void LogFile::Open(std::uint64_t identity) {
+  if (IsOpen() && m_identity == identity && IsNamed()) return;
+  const int flags = (m_readOnly ? O_RDONLY : O_RDWR) | O_CLOEXEC | O_NONBLOCK;
+  const int file = ::open(m_path.c_str(), flags);
+  if (file < 0 && errno != ENOENT) throw LmdbError(std::string("open ") + kLogFile + " of", m_space, errno);
+  Replace(file);
+  m_identity = identity;
+}
+
+// Whether the name still is that of the file that is open.
+bool LogFile::IsNamed() const noexcept {
+  struct stat open {}, named {};
+  return ::fstat(m_file, &open) == 0 && ::stat(m_path.c_str(), &named) == 0 && open.st_ino == named.st_ino &&
+         open.st_dev == named.st_dev;
+}
+
+bool LogFile::IsWhole(std::uint64_t identity) const noexcept {
+  struct stat status {};
+  return IsOpen() && m_identity == identity && ::fstat(m_file, &status) == 0 &&
+         static_cast<std::uint64_t>(status.st_size) >= kBytes;
+}
+
+Bytes LogFile::Read(std::uint64_t from, std::uint64_t to) const {
+  Bytes bytes(from < to && IsOpen() ? to - from : 0);
+  std::size_t read = 0;
+  while (read < bytes.size()) {
+    const ssize_t count =
+        ::pread(m_file, bytes.data() + read, bytes.size() - read, static_cast<off_t>(from + read));
+    if (count < 0 && errno == EINTR) continue;
+    if (count < 0) throw LmdbError(std::string("read ") + kLogFile + " of", m_space, errno);
+    if (count == 0) break;
+    read += static_cast<std::size_t>(count);
+  }
+  bytes.resize(read);
+  return bytes;
+}
+
+int LogFile::Write(ByteView bytes, std::uint64_t offset) noexcept {
+  while (!bytes.empty()) {
+    const ssize_t written = ::pwrite(m_file, bytes.data(), bytes.size(), static_cast<off_t>(offset));
+    if (written < 0 && errno == EINTR) continue;
+    if (written <= 0) return written < 0 ? errno : ENOSPC;
+    bytes = bytes.subspan(static_cast<std::size_t>(written));
+    offset += static_cast<std::uint64_t>(written);
+  }
+  return 0;
+}
+
+int LogFile::Flush() noexcept {
+  return !m_sync || ::fdatasync(m_file) == 0 ? 0 : errno;
+}
+
+// As with data.mdb, the file has its name only when it is whole, so that no other process meets half of it.
+bool LogFile::Make(std::uint64_t identity) noexcept {
+  try {
+    const std::filesystem::path unfinished = m_folder / kUnfinishedLogFile;
+    const Bytes zeros(kBytes, 0);
+    const int file = ::open(unfinished.c_str(), O_RDWR | O_CREAT | O_TRUNC | O_CLOEXEC, 0666);
+    if (file < 0) return false;
+    Replace(file);
+    if (Write(zeros, 0) == 0 && (!m_sync || ::fsync(file) == 0) &&
+        std::rename(unfinished.c_str(), m_path.c_str()) == 0) {
+      if (m_sync) SyncName();
+      m_identity = identity;
+      return true;
+    }
+    ::unlink(unfinished.c_str());
+  } catch (const std::exception&) {
+    // What could not be synced is not used.
+  }
+  Replace(-1);
+  return false;
+}
+
+void LogFile::SyncName() const {
+  SyncFolder(m_folder, m_space);
+}
+
+void LogFile::SyncAll() const {
+  if (!IsOpen()) return;
+  if (::fdatasync(m_file) != 0) throw LmdbError(std::string("flush ") + kLogFile + " of", m_space, errno);
+  SyncName();
+}
+
+std::uint64_t LogFile::DiskBytes() const noexcept {
+  struct stat status {};
+  if (!IsOpen() || ::fstat(m_file, &status) != 0) return 0;
+  constexpr std::uint64_t kBlockBytes = 512;
+  return static_cast<std::uint64_t>(status.st_blocks) * kBlockBytes;
+}
+
+}  // namespace vemo
