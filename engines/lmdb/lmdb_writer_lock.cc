@@ -7,6 +7,7 @@
 #include <algorithm>
 #include <array>
 #include <cerrno>
+#include <cstdio>
 #include <thread>
 
 #include "engines/lmdb/lmdb_error.h"
@@ -15,9 +16,11 @@
 namespace vemo {
 namespace {
 
-// Blank for a moment after each lock, and never trusted for more than a message.
+using Line = std::array<char, 20>;
+
+// That of the last holder for a moment after each lock, and never trusted for more than a message.
 std::string HolderText(int file) {
-  std::array<char, 20> text{};
+  Line text{};
   const ssize_t size = ::pread(file, text.data(), text.size(), 0);
   std::string pid;
   for (ssize_t i = 0;
@@ -30,10 +33,13 @@ std::string HolderText(int file) {
   return "process " + pid;
 }
 
-// Leaves `text` in the file where the disk lets it: the lock holds whether or not its holder can be named.
-void WriteHolder(int file, const std::string& text) {
-  if (::ftruncate(file, 0) != 0) return;
-  if (::pwrite(file, text.data(), text.size(), 0) < 0) return;
+// Leaves the name of the holder in the file where the disk lets it: the lock holds whether or not its holder can be named. A
+// file that changes with each transaction would be written by the file system with each, so a name that is there stays.
+void WriteHolder(int file, pid_t holder) {
+  Line line{}, before{};
+  std::snprintf(line.data(), line.size(), "%-18ld\n", static_cast<long>(holder));
+  if (::pread(file, before.data(), before.size(), 0) == static_cast<ssize_t>(before.size()) && before == line) return;
+  if (::pwrite(file, line.data(), line.size(), 0) < 0) return;
 }
 
 }  // namespace
@@ -53,10 +59,7 @@ LmdbWriterLock::LmdbWriterLock(const std::filesystem::path& folder, const std::s
 
 LmdbWriterLock::~LmdbWriterLock() {
   // Descriptors inherited over fork share the lock: the holder must release it by name, a child must not.
-  if (m_process == ::getpid()) {
-    WriteHolder(m_file, "");
-    ::flock(m_file, LOCK_UN);
-  }
+  if (m_process == ::getpid()) ::flock(m_file, LOCK_UN);
   ::close(m_file);
 }
 
@@ -79,7 +82,7 @@ void LmdbWriterLock::Acquire(const std::string& space, std::chrono::milliseconds
     std::this_thread::sleep_for(std::min(nap, bounded - waited));
     nap = std::min(2 * nap, kLongestNap);
   }
-  WriteHolder(m_file, std::to_string(m_process) + "\n");
+  WriteHolder(m_file, m_process);
 }
 
 }  // namespace vemo
