@@ -1,41 +1,15 @@
 #include "engines/lmdb/commit_log.h"
 
 #include <algorithm>
-#include <cstring>
 #include <random>
 #include <utility>
 
 #include "engines/lmdb/lmdb_error.h"
 #include "engines/lmdb/space_folder.h"
-#include "platform/error.h"
 
 namespace vemo {
 
 namespace {
-
-// Where in `log`, from `from` on, the next whole entry of that base and of a commit from that of `least` on
-// begins; nothing where there is none.
-std::optional<std::size_t> FindEntry(ByteView log, std::size_t from, const LogPlace& least,
-                                     std::uint64_t identity) {
-  for (std::size_t at = from; at + kLogHeaderBytes <= log.size(); at += kLogAlignment) {
-    std::uint64_t commit;  // what stands first in a header: most of the file is zeros
-    std::memcpy(&commit, &log[at], sizeof commit);
-    if (commit < least.commit) continue;
-    const std::optional<LogPlace> found = PlaceOfLogHeader(log.subspan(at), identity);
-    if (found && found->base == least.base && found->commit >= least.commit &&
-        ReadLogEntry(log.subspan(at), identity))
-      return at;
-  }
-  return std::nullopt;
-}
-
-std::optional<LoggedCommit> Parse(ByteView payload) {
-  try {
-    return ParseLoggedCommit(Bytes(payload.begin(), payload.end()));
-  } catch (const MalformedBytes&) {
-    return std::nullopt;
-  }
-}
 
 bool IsOf(const std::optional<LogSeal>& sealed, const LogBase& base) {
   return sealed && sealed->base == base.commit;
@@ -71,36 +45,12 @@ std::optional<LogPlace> CommitLog::PlaceAt(std::uint64_t offset, const LogBase& 
   return PlaceOfLogHeader(m_file.Read(offset, offset + kLogHeaderBytes), base.identity);
 }
 
-// What `log`, the bytes behind the tail, has.
-std::vector<CommitLog::ReadCommit> CommitLog::Read(const LogBase& base, ByteView log,
-                                                   std::uint64_t lastSealed, Until until) const {
+// Those that were scanned from the end of the tail on.
+void CommitLog::TakeIn(std::vector<ScannedCommit> commits) {
   const std::uint64_t from = m_tail->End();
-  std::vector<ReadCommit> commits;
-  std::size_t at = 0;
-  std::uint64_t next = m_tail->Last() + 1;
-  while (until == Until::kLastWhole || next <= lastSealed) {
-    const std::optional<LogEntry> entry = ReadLogEntry(log.subspan(at), base.identity);
-    if (entry && entry->place == LogPlace{next, base.commit}) {
-      at = std::min(at + entry->bytes, log.size());
-      commits.push_back({Parse(entry->payload), from + at});
-      ++next;
-      continue;
-    }
-    // A whole entry further on tells that this one was whole too.
-    const std::optional<std::size_t> later = FindEntry(log, at, {next + 1, base.commit}, base.identity);
-    const std::uint64_t resumed =
-        later ? PlaceOfLogHeader(log.subspan(*later), base.identity)->commit : lastSealed + 1;
-    if (resumed <= next) break;
-    at = later.value_or(log.size());
-    for (; next < resumed; ++next) commits.push_back({std::nullopt, from + at});
-  }
-  return commits;
-}
-
-void CommitLog::TakeIn(std::vector<ReadCommit> commits) {
-  for (ReadCommit& read : commits) {
-    m_tail->MakeRoomFor(read.commit);
-    m_tail->Add(std::move(read.commit), read.end);
+  for (ScannedCommit& scanned : commits) {
+    m_tail->MakeRoomFor(scanned.commit);
+    m_tail->Add(std::move(scanned.commit), from + scanned.end);
   }
 }
 
@@ -114,9 +64,9 @@ CommitLog::Answer CommitLog::Follow(const LogBase& base, const SealFile& seal,
   TailBehind(base.commit);
   if (IsOf(sealed, base) && sealed->last > m_tail->Last()) {
     m_file.Open(base.identity);
-    const Bytes log = m_file.Read(m_tail->End(), std::min<std::uint64_t>(sealed->end, LogFile::kBytes));
-    std::vector<ReadCommit> commits = Read(base, log, sealed->last, Until::kLastSealed);
-    const auto isDamaged = [](const ReadCommit& read) { return !read.commit; };
+    const Bytes log = m_file.Read(m_tail->End(), sealed->end);
+    std::vector<ScannedCommit> commits = ScanLog(log, Next(), base.identity, sealed->last, ScanUntil::kLastSealed);
+    const auto isDamaged = [](const ScannedCommit& scanned) { return !scanned.commit; };
     if (std::any_of(commits.begin(), commits.end(), isDamaged) && !isNewest()) return Answer::kOvertaken;
     TakeIn(std::move(commits));
   }
@@ -143,7 +93,7 @@ void CommitLog::RequireRightFile(const LogBase& base, const std::optional<LogSea
   if (!m_file.IsOpen() && !isSealedAsEmpty) {
     ThrowDamaged(std::string(kLogFile) + " is missing, which may have the newest commits", base);
   }
-  const Bytes log = m_file.Read(0, LogFile::kBytes);
+  const Bytes log = m_file.Read(0, kLogBytes);
   const std::optional<LogPlace> first = PlaceOfLogHeader(log, base.identity);
   // A first entry that is not whole was never acknowledged, and data.mdb may have got another commit of its number.
   const bool isNewer = first && first->base > base.commit;
@@ -160,8 +110,8 @@ bool CommitLog::NeedsRecovery(const LogBase& base, const SealFile& seal) {
   if (m_isInDoubt || !IsOf(sealed, base)) return true;
   m_file.Open(base.identity);
   if (!m_file.IsOpen()) return true;
-  const Bytes rest = m_file.Read(sealed->end, LogFile::kBytes);
-  return FindEntry(rest, 0, {sealed->last + 1, base.commit}, base.identity).has_value();
+  const Bytes rest = m_file.Read(sealed->end, kLogBytes);
+  return FindLogEntry(rest, {sealed->last + 1, base.commit}, base.identity).has_value();
 }
 
 LogPosition CommitLog::Recover(const LogBase& base, SealFile& seal) {
@@ -171,8 +121,8 @@ LogPosition CommitLog::Recover(const LogBase& base, SealFile& seal) {
   m_file.Open(base.identity);
   const std::optional<LogSeal> sealed = seal.Read().log;
   const std::uint64_t lastSealed = IsOf(sealed, base) ? sealed->last : base.commit;
-  const LogPlace next{m_tail->Last() + 1, base.commit};
-  const bool isFollowed = m_isSearched && !m_isInDoubt && m_tail->Last() >= lastSealed && PlaceAt(m_tail->End(), base) != next;
+  const bool isFollowed =
+      m_isSearched && !m_isInDoubt && m_tail->Last() >= lastSealed && PlaceAt(m_tail->End(), base) != Next();
   if (!isFollowed) Search(base, sealed, lastSealed, seal);
   return Position();
 }
@@ -181,12 +131,12 @@ LogPosition CommitLog::Recover(const LogBase& base, SealFile& seal) {
 // gets to the disk for certain: a process that ended may have taken an entry back, and not have got as far.
 void CommitLog::Search(const LogBase& base, const std::optional<LogSeal>& sealed, std::uint64_t lastSealed, SealFile& seal) {
   RequireRightFile(base, sealed);
-  const Bytes log = m_file.Read(m_tail->End(), LogFile::kBytes);
-  std::vector<ReadCommit> commits = Read(base, log, lastSealed, Until::kLastWhole);
-  const std::uint64_t end = commits.empty() ? m_tail->End() : commits.back().end;
+  const Bytes log = m_file.Read(m_tail->End(), kLogBytes);
+  std::vector<ScannedCommit> commits = ScanLog(log, Next(), base.identity, lastSealed, ScanUntil::kLastWhole);
+  const std::size_t end = commits.empty() ? 0 : commits.back().end;
   const bool isNews = m_tail->Last() + commits.size() > lastSealed;
   const bool isCertain = m_isSearched && !m_isInDoubt && !isNews;
-  if (!isCertain && m_file.IsOpen() && !m_file.readOnly()) WriteAgain(ByteView(log).first(end - m_tail->End()));
+  if (!isCertain && m_file.IsOpen() && !m_file.readOnly()) WriteAgain(ByteView(log).first(end));
   TakeIn(std::move(commits));
   m_isSearched = true;
   m_isInDoubt = false;
@@ -197,7 +147,7 @@ void CommitLog::Search(const LogBase& base, const std::optional<LogSeal>& sealed
 // what is not, and the next flush would tell nothing of it.
 void CommitLog::WriteAgain(ByteView entries) {
   Bytes bytes(entries.begin(), entries.end());
-  if (m_tail->End() + bytes.size() + kLogHeaderBytes <= LogFile::kBytes) bytes.resize(bytes.size() + kLogHeaderBytes);
+  if (m_tail->End() + bytes.size() + kLogHeaderBytes <= kLogBytes) bytes.resize(bytes.size() + kLogHeaderBytes);
   int failure = m_file.Write(bytes, m_tail->End());
   if (failure == 0) failure = m_file.Flush();
   if (failure != 0) throw LmdbError(std::string("write ") + kLogFile + " of", m_space, failure);
@@ -210,7 +160,7 @@ bool CommitLog::IsUsable(const LogBase& base) {
 
 bool CommitLog::HasRoom(std::size_t payloadBytes) {
   const std::lock_guard lock(m_mutex);
-  return m_tail->End() + LogEntryBytes(payloadBytes) <= LogFile::kBytes;
+  return m_tail->End() + LogEntryBytes(payloadBytes) <= kLogBytes;
 }
 
 std::optional<std::uint64_t> CommitLog::Make() {

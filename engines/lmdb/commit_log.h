@@ -25,6 +25,7 @@
 #include <vector>
 
 #include "engines/lmdb/log_file.h"
+#include "engines/lmdb/log_scan.h"
 #include "engines/lmdb/log_tail.h"
 #include "engines/lmdb/seal_file.h"
 
@@ -87,20 +88,11 @@ class CommitLog {
   std::uint64_t DiskBytes();
 
  private:
-  // A commit, or a damaged one, and where the next entry begins.
-  struct ReadCommit {
-    std::optional<LoggedCommit> commit;
-    std::uint64_t end;
-  };
-  // How far commits are read.
-  enum class Until { kLastSealed, kLastWhole };
-
   LogTail& TailBehind(std::uint64_t commit);
   LogPosition Position() const { return {m_tail, m_tail->Last()}; }
+  LogPlace Next() const { return {m_tail->Last() + 1, m_tail->base()}; }
   std::optional<LogPlace> PlaceAt(std::uint64_t offset, const LogBase& base) const;
-  std::vector<ReadCommit> Read(const LogBase& base, ByteView log, std::uint64_t lastSealed,
-                               Until until) const;
-  void TakeIn(std::vector<ReadCommit> commits);
+  void TakeIn(std::vector<ScannedCommit> commits);
   void RequireRightFile(const LogBase& base, const std::optional<LogSeal>& sealed) const;
   void Search(const LogBase& base, const std::optional<LogSeal>& sealed, std::uint64_t lastSealed, SealFile& seal);
   void WriteAgain(ByteView entries);

@@ -60,9 +60,15 @@ struct LogEntry {
   std::size_t bytes = 0;  // from one entry to the next
 };
 
+inline constexpr std::size_t kLogBytes = std::size_t{256} << 10;
 inline constexpr std::size_t kLogHeaderBytes = 40;
 inline constexpr std::size_t kLogAlignment = 8;  // of entries
 std::size_t LogEntryBytes(std::size_t payloadBytes) noexcept;
+
+// Whether a log behind that base has room for so many commits: a number that was made up must not be counted up to.
+inline bool CanBeInLog(const LogPlace& place) noexcept {
+  return place.commit > place.base && place.commit - place.base <= kLogBytes / kLogHeaderBytes;
+}
 
 Bytes EncodeLogEntry(const LogPlace& place, ByteView payload, std::uint64_t identity);
 

@@ -4,12 +4,12 @@
 #include <sys/stat.h>
 #include <unistd.h>
 
-#include <algorithm>
 #include <cerrno>
 #include <cstdio>
 #include <exception>
 
 #include "engines/lmdb/lmdb_error.h"
+#include "engines/lmdb/log_entry.h"
 #include "engines/lmdb/space_folder.h"
 
 namespace vemo {
@@ -45,7 +45,7 @@ bool LogFile::IsNamed() const noexcept {
 bool LogFile::IsWhole(std::uint64_t identity) const noexcept {
   struct stat status {};
   return IsOpen() && m_identity == identity && ::fstat(m_file, &status) == 0 &&
-         static_cast<std::uint64_t>(status.st_size) >= kBytes;
+         static_cast<std::uint64_t>(status.st_size) >= kLogBytes;
 }
 
 Bytes LogFile::Read(std::uint64_t from, std::uint64_t to) const {
@@ -82,7 +82,7 @@ int LogFile::Flush() noexcept {
 bool LogFile::Make(std::uint64_t identity) noexcept {
   try {
     const std::filesystem::path unfinished = m_folder / kUnfinishedLogFile;
-    const Bytes zeros(kBytes, 0);
+    const Bytes zeros(kLogBytes, 0);
     const int file = ::open(unfinished.c_str(), O_RDWR | O_CREAT | O_TRUNC | O_CLOEXEC, 0666);
     if (file < 0) return false;
     Replace(file);

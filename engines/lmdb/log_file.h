@@ -14,8 +14,6 @@ namespace vemo {
 
 class LogFile {
  public:
-  static constexpr std::size_t kBytes = std::size_t{256} << 10;
-
   // With `sync`, what Flush and Make have done survives a loss of power.
   LogFile(const std::filesystem::path& folder, const std::string& space, bool readOnly, bool sync);
   ~LogFile();

@@ -13,6 +13,7 @@
 #include <cstring>
 
 #include "engines/lmdb/lmdb_error.h"
+#include "engines/lmdb/log_entry.h"
 
 namespace vemo {
 namespace {
@@ -100,8 +101,10 @@ SealFile::Slots SealFile::Read() const {
   }
   for (std::size_t i = kFirstLogSlot; i < kSlots; ++i) {
     const auto numbers = NumbersIn(&bytes[i * kSlotDistance], i, kLogMagic);
-    if (!numbers || (read.log && read.log->last > (*numbers)[1])) continue;
-    read.log = LogSeal{(*numbers)[0], (*numbers)[1], (*numbers)[2]};
+    if (!numbers) continue;
+    const LogSeal seal{(*numbers)[0], (*numbers)[1], (*numbers)[2]};
+    const bool isPossible = (seal.last == seal.base || CanBeInLog({seal.last, seal.base})) && seal.end <= kLogBytes;
+    if (isPossible && (!read.log || read.log->last < seal.last)) read.log = seal;
   }
   return read;
 }

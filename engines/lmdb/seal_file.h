@@ -49,7 +49,7 @@ class SealFile {
 
   struct Slots {
     std::array<std::optional<CommitSeal>, 2> slots;  // those that are whole
-    std::optional<LogSeal> log;                      // the newest one
+    std::optional<LogSeal> log;                      // the newest one that a log can be of
     std::optional<CommitSeal> Of(std::uint64_t transaction) const;
     std::uint64_t Newest() const;  // 0 where there is none
   };

@@ -119,7 +119,7 @@ TEST_F(CommitLogs, ThatAreFullGoToTheTablesAndBeginAgain) {
   Open(false);  // for the time that it takes
   std::size_t written = 0;
   std::string data = ReadFile(file(kDataFile));
-  for (std::uint64_t i = 0; i < 2 * LogFile::kBytes / kLogHeaderBytes && written < 3; ++i) {
+  for (std::uint64_t i = 0; i < 2 * kLogBytes / kLogHeaderBytes && written < 3; ++i) {
     Edit(1 + i % kRecords);
     if (i % 64 != 0) continue;
     ExpectAll();
@@ -129,7 +129,7 @@ TEST_F(CommitLogs, ThatAreFullGoToTheTablesAndBeginAgain) {
     }
   }
   EXPECT_EQ(written, 3u);
-  EXPECT_EQ(fs::file_size(file(kLogFile)), LogFile::kBytes);
+  EXPECT_EQ(fs::file_size(file(kLogFile)), kLogBytes);
   Close();
   Open();
   ExpectAll();
@@ -438,7 +438,7 @@ TEST_F(CommitLogs, ThatAreCutOffBehindTheirEndAreNotWrittenTo) {
   Edit(3);
   EXPECT_FALSE(ReadFile(file(kDataFile)) == data);
   Edit(4);
-  EXPECT_EQ(fs::file_size(file(kLogFile)), LogFile::kBytes) << "made anew, once it is empty";
+  EXPECT_EQ(fs::file_size(file(kLogFile)), kLogBytes) << "made anew, once it is empty";
   Edit(5);
   Close();
   Open();

@@ -85,6 +85,18 @@ class LmdbSeal : public testing::Test {
   TempFolder m_folder;
 };
 
+TEST_F(LmdbSeal, OfALogThatNoLogCanBeIsNone) {
+  constexpr std::uint64_t kHuge = std::uint64_t{1} << 60;
+  SealFile seal(file(kSealFile), "space", false);
+  ASSERT_TRUE(seal.Write(LogSeal{5, 7, 400}));
+  ASSERT_TRUE(seal.Write(LogSeal{5, kHuge, 500}));
+  EXPECT_EQ(seal.Read().log->last, 7u);
+  ASSERT_TRUE(seal.Write(LogSeal{5, 8, kHuge}));
+  EXPECT_EQ(seal.Read().log->last, 7u);
+  ASSERT_TRUE(seal.Write(LogSeal{9, 9, 0}));
+  EXPECT_EQ(seal.Read().log->last, 9u) << "one that is empty";
+}
+
 TEST_F(LmdbSeal, RootsThatAreNotThoseThatWereSealedAreNotRead) {
   ChangeSeal([](CommitSeal& seal) { seal.rootsDigest ^= 1; });
   const std::string message = MessageOf<DamagedStorage>([this] { OpenAt(space())->OpenSnapshot(); });

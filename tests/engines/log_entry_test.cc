@@ -82,5 +82,15 @@ TEST(LogEntries, WithAnyBitChangedOrOfAnotherLogAreNone) {
   }
 }
 
+TEST(LogPlaces, AreThoseOfAsManyCommitsAsALogHasRoomForBehindTheirBase) {
+  constexpr std::uint64_t kBase = 10;
+  constexpr std::uint64_t kMost = kLogBytes / kLogHeaderBytes;
+  EXPECT_FALSE(CanBeInLog({kBase, kBase}));
+  EXPECT_FALSE(CanBeInLog({kBase - 1, kBase}));
+  EXPECT_TRUE(CanBeInLog({kBase + 1, kBase}));
+  EXPECT_TRUE(CanBeInLog({kBase + kMost, kBase}));
+  EXPECT_FALSE(CanBeInLog({kBase + kMost + 1, kBase}));
+}
+
 }  // namespace
 }  // namespace vemo::test
