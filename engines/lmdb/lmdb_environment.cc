@@ -9,14 +9,12 @@
 #include <bit>
 #include <cerrno>
 #include <chrono>
-#include <cstring>
 #include <memory>
-#include <set>
-#include <sstream>
 
 #include "engines/fork_count.h"
 #include "engines/lmdb/empty_data.h"
 #include "engines/lmdb/lmdb_error.h"
+#include "engines/lmdb/lmdb_readers.h"
 #include "engines/lmdb/space_writer.h"
 #include "platform/error.h"
 
@@ -185,6 +183,7 @@ void LmdbEnvironment::Open(std::size_t mapBytes) {
     if (!m_options.syncEachCommit) flags |= MDB_NOSYNC;
     CheckOpened(mdb_env_open(m_env, m_path.c_str(), flags, kFileMode), m_name);
     m_sealed = std::make_unique<SealedSpace>(m_path, m_name, m_options.readOnly, mapBytes);
+    m_synced.emplace(m_sealed->file());
     m_log = std::make_unique<CommitLog>(m_path, m_name, m_options.readOnly, m_options.syncEachCommit);
     m_changes = std::make_shared<ChangeIndex>();
     RequireSoundHeader(*m_sealed->file());
@@ -221,8 +220,8 @@ void LmdbEnvironment::Close() noexcept {
   mdb_env_close(m_env);
   m_env = nullptr;
   m_log.reset();
+  m_synced.reset();
   m_sealed.reset();
-  m_onDisk.reset();
 }
 
 void LmdbEnvironment::OpenOrCreateTables() {
@@ -320,32 +319,21 @@ void LmdbEnvironment::Write(const char* operation, const std::function<void(Spac
 void LmdbEnvironment::CommitTables(MDB_txn* begun, const LogBase& before, const char* operation) {
   Transaction txn(begun);
   const std::uint64_t transaction = mdb_txn_id(begun);
-  if (before.identity != 0 && m_options.syncEachCommit && !IsOnDisk(CurrentMetaPages())) m_log->SyncName();
-  m_onDisk.reset();
+  if (before.identity != 0 && m_options.syncEachCommit && !m_synced->IsOnDisk()) m_log->SyncName();
+  m_synced->Forget();
   CheckLmdb(mdb_txn_commit(txn.release()), operation, m_name);
-  if (m_options.syncEachCommit) m_onDisk = CurrentMetaPages();
+  if (m_options.syncEachCommit) m_synced->Remember();
   m_sealed->Committed(transaction);
   if (const KnownStatePtr known = m_sealed->Known(transaction)) m_log->Begin(before, LogBaseOf(*known), m_sealed->seal());
 }
 
-// A commit in the log is lost with the one that it goes behind: another process may not have synced that, and where one of LMDB
-// fails, what LMDB writes to take it back is not synced either.
+// What a commit in the log goes behind.
 void LmdbEnvironment::RequireOnDisk(const char* operation) {
   if (!m_options.syncEachCommit) return;
-  const MetaPages pages = CurrentMetaPages();
-  if (IsOnDisk(pages)) return;
-  CheckLmdb(mdb_env_sync(m_env, 1), operation, m_name);
-  m_log->SyncName();
-  m_onDisk = pages;
-}
-
-LmdbEnvironment::MetaPages LmdbEnvironment::CurrentMetaPages() const noexcept {
-  const std::size_t pageBytes = PageBytesOf(*m_sealed->file());
-  return {ReadMetaPage(*m_sealed->file(), 0, pageBytes), ReadMetaPage(*m_sealed->file(), 1, pageBytes)};
-}
-
-bool LmdbEnvironment::IsOnDisk(const MetaPages& pages) const noexcept {
-  return m_onDisk && std::memcmp(m_onDisk->data(), pages.data(), sizeof pages) == 0;
+  m_synced->Require([&] {
+    CheckLmdb(mdb_env_sync(m_env, 1), operation, m_name);
+    m_log->SyncName();
+  });
 }
 
 // Of this or another process, as the meta pages tell.
@@ -392,29 +380,13 @@ std::uint64_t LmdbEnvironment::CountRecords() {
   return records;
 }
 
-// LMDB prints its reader table as text: process id, thread, and the transaction or a dash.
 std::vector<std::int64_t> LmdbEnvironment::ReadersElsewhere() {
   RequireOwnProcess("list readers");
-  std::string table;
-  {
-    const std::scoped_lock lock(m_state);
-    if (m_env == nullptr) return {};
-    const auto append = [](const char* line, void* text) {
-      *static_cast<std::string*>(text) += line;
-      return 0;
-    };
-    mdb_reader_list(m_env, append, &table);
-  }
-  std::set<std::int64_t> processes;
-  std::istringstream lines(table);
-  for (std::string line; std::getline(lines, line);) {
-    std::istringstream words(line);
-    std::int64_t process = 0;
-    std::string thread, transaction;
-    if (words >> process >> thread >> transaction && transaction != "-" && process != m_process)
-      processes.insert(process);
-  }
-  return {processes.begin(), processes.end()};
+  const std::lock_guard lock(m_state);
+  if (m_env == nullptr) return {};
+  std::vector<std::int64_t> processes = ProcessesReading(m_env);
+  std::erase(processes, m_process);
+  return processes;
 }
 
 int LmdbEnvironment::TryBeginTransaction(MDB_txn** txn) {

@@ -11,7 +11,6 @@
 
 #include <sys/types.h>
 
-#include <array>
 #include <chrono>
 #include <cstddef>
 #include <cstdint>
@@ -30,6 +29,7 @@
 #include "engines/lmdb/lmdb_layout.h"
 #include "engines/lmdb/sealed_space.h"
 #include "engines/lmdb/space_folder.h"
+#include "engines/lmdb/synced_data.h"
 
 struct MDB_env;
 
@@ -84,9 +84,6 @@ class LmdbEnvironment {
   // The two below need m_writing, and commits locked.
   void CommitTables(MDB_txn* begun, const LogBase& before, const char* operation);
   void RequireOnDisk(const char* operation);
-  using MetaPages = std::array<MetaPage, kMetaPages>;
-  MetaPages CurrentMetaPages() const noexcept;
-  bool IsOnDisk(const MetaPages& pages) const noexcept;
 
   bool IsOwnProcess() const noexcept;
   void ProbeData() const;
@@ -122,7 +119,7 @@ class LmdbEnvironment {
   std::unique_ptr<SealedSpace> m_sealed;  // of the open environment
   std::unique_ptr<CommitLog> m_log;       // the same
   std::shared_ptr<ChangeIndex> m_changes = std::make_shared<ChangeIndex>();
-  std::optional<MetaPages> m_onDisk;      // those that are known to be, with all below; guarded by m_writing
+  std::optional<SyncedData> m_synced;     // the same; guarded by m_writing
   LmdbTables m_tables;
   std::size_t m_mapBytes = 0;
   std::size_t m_openSnapshots = 0;
