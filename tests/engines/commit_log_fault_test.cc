@@ -11,66 +11,21 @@
 #include "engines/lmdb/log_file.h"
 #include "engines/lmdb/space_folder.h"
 #include "tests/engines/child_process.h"
-#include "tests/engines/lmdb_site.h"
+#include "tests/engines/logged_space.h"
 #include "tests/support/failing_allocator.h"
 #include "tests/support/failing_disk.h"
-#include "tests/support/temp_folder.h"
 
 namespace vemo::test {
 namespace {
 
 namespace fs = std::filesystem;
 
-enum class Syncs { kEachCommit, kNothing };
-enum class Access { kWriting, kReading };
-
-std::unique_ptr<Engine> OpenSpace(const fs::path& path, Syncs syncs = Syncs::kEachCommit,
-                                  Access access = Access::kWriting) {
-  LmdbOptions options;
-  options.path = path;
-  options.syncEachCommit = syncs == Syncs::kEachCommit;
-  options.create = access == Access::kWriting;
-  options.readOnly = access == Access::kReading;
-  return OpenLmdbEngine(options);
-}
-
 bool IsMetaPage(const WatchedDisk::Write& write) {
   constexpr off_t kEndOfMetaPages = 2 * 4096;
   return write.file == kDataFile && write.offset < kEndOfMetaPages && write.size < 4096;
 }
 
-constexpr std::uint64_t kEdited = 3;
-
-// The first commit makes records, the second one the log.
-class CommitLogFaults : public testing::Test {
- protected:
-  CommitLogFaults() {
-    const auto engine = OpenSpace(space());
-    BatchBuilder batch;
-    for (std::uint64_t oid = 1; oid <= 20; ++oid) batch.Put(oid, EditedRecord(oid, 0));
-    engine->Commit(batch.At(0));
-    Edit(*engine, 1, 1);
-  }
-  fs::path space() const { return m_folder.path() / "space"; }
-  fs::path file(const char* name) const { return space() / name; }
-
-  static void Edit(Engine& engine, std::uint64_t generation, std::uint64_t version) {
-    BatchBuilder batch;
-    engine.Commit(batch.Put(kEdited, EditedRecord(kEdited, version)).At(generation));
-  }
-  // A commit that no log takes.
-  static void AddRecord(Engine& engine, std::uint64_t generation) {
-    BatchBuilder batch;
-    engine.Commit(batch.Put(1000 + generation, "new").At(generation));
-  }
-  static std::uint64_t GenerationOf(Engine& engine) { return engine.OpenSnapshot()->Generation(); }
-  static std::optional<std::string> EditedIn(Engine& engine) {
-    return ToText(engine.OpenSnapshot()->Read(OID(kEdited)));
-  }
-
- private:
-  TempFolder m_folder;
-};
+class CommitLogFaults : public LoggedSpace {};
 
 // LMDB's table of readers has the transaction before then, and the meta page the new one.
 TEST_F(CommitLogFaults, AKillWithinACommitOfLmdbLeavesASpaceThatCanBeRead) {
