@@ -63,7 +63,7 @@ CommitLog::Answer CommitLog::Follow(const LogBase& base, const SealFile& seal,
   if (sealed && sealed->base > base.commit) return Answer::kOvertaken;
   TailBehind(base.commit);
   if (IsOf(sealed, base) && sealed->last > m_tail->Last()) {
-    m_file.Open(base.identity);
+    m_file.Open();
     const Bytes log = m_file.Read(m_tail->End(), sealed->end);
     std::vector<ScannedCommit> commits = ScanLog(log, Next(), base.identity, sealed->last, ScanUntil::kLastSealed);
     const auto isDamaged = [](const ScannedCommit& scanned) { return !scanned.commit; };
@@ -108,7 +108,7 @@ bool CommitLog::NeedsRecovery(const LogBase& base, const SealFile& seal) {
   if (base.identity == 0) return false;
   const std::optional<LogSeal> sealed = seal.Read().log;
   if (m_isInDoubt || !IsOf(sealed, base)) return true;
-  m_file.Open(base.identity);
+  m_file.Open();
   if (!m_file.IsOpen()) return true;
   const Bytes rest = m_file.Read(sealed->end, kLogBytes);
   return FindLogEntry(rest, {sealed->last + 1, base.commit}, base.identity).has_value();
@@ -118,7 +118,7 @@ LogPosition CommitLog::Recover(const LogBase& base, SealFile& seal) {
   const std::lock_guard lock(m_mutex);
   TailBehind(base.commit);
   if (base.identity == 0) return Position();
-  m_file.Open(base.identity);
+  m_file.Open();
   const std::optional<LogSeal> sealed = seal.Read().log;
   const std::uint64_t lastSealed = IsOf(sealed, base) ? sealed->last : base.commit;
   const bool isFollowed =
@@ -155,7 +155,7 @@ void CommitLog::WriteAgain(ByteView entries) {
 
 bool CommitLog::IsUsable(const LogBase& base) {
   const std::lock_guard lock(m_mutex);
-  return base.identity != 0 && !m_hasFailed && m_file.IsWhole(base.identity);
+  return base.identity != 0 && !m_hasFailed && m_file.IsWhole();
 }
 
 bool CommitLog::HasRoom(std::size_t payloadBytes) {
@@ -169,7 +169,7 @@ std::optional<std::uint64_t> CommitLog::Make() {
   std::random_device random;
   std::uint64_t identity = 0;
   while (identity == 0) identity = std::uint64_t{random()} << 32 | random();
-  m_hasFailed = !m_file.Make(identity);
+  m_hasFailed = !m_file.Make();
   return m_hasFailed ? std::nullopt : std::optional(identity);
 }
 

@@ -320,7 +320,6 @@ void LmdbEnvironment::CommitTables(MDB_txn* begun, const LogBase& before, const 
   Transaction txn(begun);
   const std::uint64_t transaction = mdb_txn_id(begun);
   if (before.identity != 0 && m_options.syncEachCommit && !m_synced->IsOnDisk()) m_log->SyncName();
-  m_synced->Forget();
   CheckLmdb(mdb_txn_commit(txn.release()), operation, m_name);
   if (m_options.syncEachCommit) m_synced->Remember();
   m_sealed->Committed(transaction);

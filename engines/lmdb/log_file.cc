@@ -26,13 +26,12 @@ void LogFile::Replace(int file) noexcept {
   m_file = file;
 }
 
-void LogFile::Open(std::uint64_t identity) {
-  if (IsOpen() && m_identity == identity && IsNamed()) return;
+void LogFile::Open() {
+  if (IsOpen() && IsNamed()) return;
   const int flags = (m_readOnly ? O_RDONLY : O_RDWR) | O_CLOEXEC | O_NONBLOCK;
   const int file = ::open(m_path.c_str(), flags);
   if (file < 0 && errno != ENOENT) throw LmdbError(std::string("open ") + kLogFile + " of", m_space, errno);
   Replace(file);
-  m_identity = identity;
 }
 
 // Whether the name still is that of the file that is open.
@@ -42,10 +41,9 @@ bool LogFile::IsNamed() const noexcept {
          open.st_dev == named.st_dev;
 }
 
-bool LogFile::IsWhole(std::uint64_t identity) const noexcept {
+bool LogFile::IsWhole() const noexcept {
   struct stat status {};
-  return IsOpen() && m_identity == identity && ::fstat(m_file, &status) == 0 &&
-         static_cast<std::uint64_t>(status.st_size) >= kLogBytes;
+  return IsOpen() && ::fstat(m_file, &status) == 0 && static_cast<std::uint64_t>(status.st_size) >= kLogBytes;
 }
 
 Bytes LogFile::Read(std::uint64_t from, std::uint64_t to) const {
@@ -79,7 +77,7 @@ int LogFile::Flush() noexcept {
 }
 
 // As with data.mdb, the file has its name only when it is whole, so that no other process meets half of it.
-bool LogFile::Make(std::uint64_t identity) noexcept {
+bool LogFile::Make() noexcept {
   try {
     const std::filesystem::path unfinished = m_folder / kUnfinishedLogFile;
     const Bytes zeros(kLogBytes, 0);
@@ -89,7 +87,6 @@ bool LogFile::Make(std::uint64_t identity) noexcept {
     if (Write(zeros, 0) == 0 && (!m_sync || ::fsync(file) == 0) &&
         std::rename(unfinished.c_str(), m_path.c_str()) == 0) {
       if (m_sync) SyncName();
-      m_identity = identity;
       return true;
     }
     ::unlink(unfinished.c_str());

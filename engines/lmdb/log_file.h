@@ -20,12 +20,12 @@ class LogFile {
   LogFile(const LogFile&) = delete;
   LogFile& operator=(const LogFile&) = delete;
 
-  // Opens the file that data.mdb means by `identity`, where it is there: another process may have made it
-  // anew since. Throws StoreError.
-  void Open(std::uint64_t identity);
+  // Opens the file that has the name now, where it is there: another process may have made it anew since. Throws
+  // StoreError.
+  void Open();
   bool IsOpen() const noexcept { return m_file >= 0; }
-  // Whether the file that is open has all its bytes, and is the one meant by `identity`.
-  bool IsWhole(std::uint64_t identity) const noexcept;
+  // Whether the file that is open has all its bytes.
+  bool IsWhole() const noexcept;
   bool readOnly() const noexcept { return m_readOnly; }
 
   // The bytes from `from` on and before `to`, as far as the file has them. Throws StoreError.
@@ -35,9 +35,9 @@ class LogFile {
   int Write(ByteView bytes, std::uint64_t offset) noexcept;
   int Flush() noexcept;
 
-  // Makes a file of zeros under `identity` and opens it instead of the one before. False where the disk
-  // refuses; then that one may be gone.
-  bool Make(std::uint64_t identity) noexcept;
+  // Makes a file of zeros and opens it instead of the one before. False where the disk refuses; then that one
+  // may be gone.
+  bool Make() noexcept;
   // Makes the name of the file survive a loss of power, and with SyncAll what is in it. They throw
   // StoreError.
   void SyncName() const;
@@ -56,7 +56,6 @@ class LogFile {
   const bool m_readOnly;
   const bool m_sync;
   int m_file = -1;
-  std::uint64_t m_identity = 0;  // under which m_file was opened
 };
 
 }  // namespace vemo

@@ -2,7 +2,7 @@
 //
 // A commit in the log is lost with the one that it goes behind, so that one must be on the disk first. LMDB syncs what it commits,
 // but another process may not have had it do so, and where a commit of LMDB fails, what LMDB writes to take it back is not synced
-// either. Each of these shows in the meta pages: what is known is known of them and of all that lies below.
+// either. Each of these leaves other meta pages: what is known is known of them and of all that lies below.
 //
 // Not to be called by two threads at once, nor while another process commits.
 #pragma once
@@ -27,9 +27,7 @@ class SyncedData {
   // Calls `sync`, which brings it there or throws, unless it is there.
   void Require(const std::function<void()>& sync);
 
-  // A commit of LMDB is about to be made, and may leave anything.
-  void Forget() noexcept { m_onDisk.reset(); }
-  // It was made and synced.
+  // LMDB has made a commit and synced it.
   void Remember() noexcept { m_onDisk = Current(); }
 
  private:

@@ -11,6 +11,7 @@ namespace {
 
 constexpr std::uint64_t kRecords = 20;
 constexpr std::uint64_t kMostCommits = 40;
+constexpr SettlingBounds kCommitsAlone{.bytes = 1u << 30, .commits = kMostCommits, .records = 1u << 30};
 
 // The first commit makes the records, the second one the log; each further one changes a record.
 class CommitLogBounds : public testing::Test {
@@ -22,12 +23,11 @@ class CommitLogBounds : public testing::Test {
     Edit(*Open());
   }
 
-  // The number of commits alone decides.
-  std::unique_ptr<Engine> Open() const {
+  std::unique_ptr<Engine> Open(const SettlingBounds& bounds = kCommitsAlone) const {
     LmdbOptions options;
     options.path = space();
     options.create = true;
-    options.pendingChanges = {.bytes = 1u << 30, .commits = kMostCommits, .records = 1u << 30};
+    options.pendingChanges = bounds;
     return OpenLmdbEngine(options);
   }
   void Edit(Engine& engine) {
@@ -49,7 +49,10 @@ class CommitLogBounds : public testing::Test {
     EXPECT_EQ(sealed.Ask(seals.Newest(), true, known), SealedSpace::Answer::kKnown);
     const SpaceNumbers& numbers = known->numbers;
     const std::uint64_t logged = m_commits - numbers.generation;
-    return {numbers.changes.first != 0 ? m_commits - numbers.changes.first + 1 : logged, logged};
+    const std::uint64_t first = numbers.changes.first;
+    EXPECT_EQ(known->state->Table(kChangesTable)->root.entries, first != 0 ? numbers.generation - first + 1 : 0)
+        << "what has been written into the records is not kept";
+    return {first != 0 ? m_commits - first + 1 : logged, logged};
   }
 
  private:
@@ -70,6 +73,22 @@ TEST_F(CommitLogBounds, TheLogHoldsAQuarterOfWhatMayWaitAndARoundEndsInTime) {
   }
   EXPECT_EQ(mostLogged, kMostCommits / 4);
   EXPECT_LT(most, kMostCommits * 9 / 10) << "from where on one commit would settle all at once";
+}
+
+TEST_F(CommitLogBounds, TheLogHoldsAQuarterOfTheRecordsAndOfTheBytesThatMayWait) {
+  constexpr std::uint64_t kBytesOfOneCommit = 24;  // about
+  constexpr SettlingBounds kRecordsAlone{.bytes = 1u << 30, .commits = 1u << 30, .records = kMostCommits};
+  constexpr SettlingBounds kBytesAlone{.bytes = kMostCommits * kBytesOfOneCommit, .commits = 1u << 30, .records = 1u << 30};
+  for (const SettlingBounds& bounds : {kRecordsAlone, kBytesAlone}) {
+    const auto engine = Open(bounds);
+    std::uint64_t mostLogged = 0;
+    for (std::uint64_t i = 0; i < 3 * kMostCommits; ++i) {
+      Edit(*engine);
+      mostLogged = std::max(mostLogged, CurrentlyWaiting().logged);
+    }
+    EXPECT_GT(mostLogged, kMostCommits / 8);
+    EXPECT_LT(mostLogged, kMostCommits / 2);
+  }
 }
 
 // Each of them settles a slice from the beginning at first.

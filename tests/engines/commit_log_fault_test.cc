@@ -4,9 +4,11 @@
 #include <sys/file.h>
 #include <unistd.h>
 
+#include <cerrno>
 #include <fstream>
 #include <iterator>
 #include <optional>
+#include <vector>
 
 #include "engines/lmdb/log_file.h"
 #include "engines/lmdb/space_folder.h"
@@ -106,6 +108,7 @@ TEST_F(CommitLogFaults, OpeningDoesNotWaitForACommit) {
 TEST_F(CommitLogFaults, AFailedCommitOfLmdbThatTheDiskHasDoesNotHideTheLog) {
   for (const bool reopens : {false, true}) {
     auto engine = OpenSpace(space());
+    Edit(*engine, GenerationOf(*engine), 76);  // what is there before is known to be on the disk
     const std::uint64_t generation = GenerationOf(*engine);
     std::string onDisk;
     {
@@ -168,15 +171,17 @@ TEST_F(CommitLogFaults, WhatIsAcknowledgedBehindAnUnsyncedCommitIsOnTheDisk) {
   });
   EXPECT_EQ(unsynced.Hear(), "done");
   unsynced.Kill();
-  int syncedData = 0, syncedLog = 0;
+  int syncedData = 0, syncedLog = 0, syncedFolder = 0;
   const auto engine = OpenSpace(space());
   const WatchedDisk disk({}, [&](const std::string& name) {
     if (name == kDataFile) ++syncedData;
     if (name == kLogFile) ++syncedLog;
+    if (name == "space") ++syncedFolder;
   });
   Edit(*engine, 3, 5);
   EXPECT_GT(syncedLog, 0);
   EXPECT_EQ(syncedData, 1);
+  EXPECT_EQ(syncedFolder, 1) << "which has the name of the log";
   syncedLog = syncedData = 0;
   Edit(*engine, 4, 6);
   EXPECT_EQ(syncedLog, 1);
@@ -317,6 +322,42 @@ TEST_F(CommitLogFaults, AfterAFlushThatFailedCommitsGoToTheTables) {
   EXPECT_EQ(EditedIn(*engine), EditedRecord(kEdited, 4));
 }
 
+TEST_F(CommitLogFaults, AnEntryThatWasNotFlushedIsTakenBackOnTheDiskAndNotLookedForAgain) {
+  const auto engine = OpenSpace(space());
+  Edit(*engine, 2, 2);
+  int written = 0, synced = 0;
+  const WatchedDisk disk(
+      [&](const WatchedDisk::Write& write) {
+        written += write.file == kLogFile;
+        return 0;
+      },
+      [&](const std::string& name) { synced += name == kLogFile; });
+  {
+    const FailingDisk failing(2, false);
+    EXPECT_THROW(Edit(*engine, 3, 3), StoreError);
+  }
+  EXPECT_EQ(written, 2);
+  EXPECT_EQ(synced, 2);
+  EXPECT_EQ(GenerationOf(*engine), 3u);
+  EXPECT_EQ(written, 2) << "who reads writes nothing";
+}
+
+// Other processes hear of it by the next one.
+TEST_F(CommitLogFaults, AfterASealThatCannotBeWrittenCommitsGoToTheTables) {
+  const auto engine = OpenSpace(space());
+  Edit(*engine, 2, 2);
+  const std::string data = ReadFile(file(kDataFile));
+  {
+    const WatchedDisk disk([](const WatchedDisk::Write& write) { return write.file == kSealFile ? EIO : 0; });
+    Edit(*engine, 3, 3);
+  }
+  EXPECT_TRUE(ReadFile(file(kDataFile)) == data);
+  EXPECT_EQ(EditedIn(*engine), EditedRecord(kEdited, 3));
+  Edit(*engine, 4, 4);
+  EXPECT_FALSE(ReadFile(file(kDataFile)) == data);
+  EXPECT_EQ(EditedIn(*engine), EditedRecord(kEdited, 4));
+}
+
 // The flush fails, and so does the write that takes the commit back.
 TEST_F(CommitLogFaults, AnEntryThatWasNotFlushedIsWrittenAgainBeforeItIsBelieved) {
   const auto engine = OpenSpace(space());
@@ -362,6 +403,7 @@ TEST_F(CommitLogFaults, AFailedCommitOfAnotherProcessThatTheDiskHasDoesNotHideTh
     });
     try {
       AddRecord(*engine, 3);
+      parent.Say("made");
     } catch (const StoreError&) {
       parent.Say("failed");
     }
@@ -429,13 +471,14 @@ TEST_F(CommitLogFaults, AnEntryThatWasTakenBackIsGoneForGoodBeforeAnotherProcess
     });
     try {
       Edit(*engine, 2, 2);
+      parent.Say("made");
     } catch (const UnknownOutcome&) {
       parent.Say("unknown");
     }
     parent.Hear();
     return true;
   });
-  EXPECT_EQ(failing.Hear(), "unknown");
+  ASSERT_EQ(failing.Hear(), "unknown");
   failing.Kill();
   bool isWritten = false, isFlushed = false;
   const WatchedDisk disk(
@@ -449,6 +492,51 @@ TEST_F(CommitLogFaults, AnEntryThatWasTakenBackIsGoneForGoodBeforeAnotherProcess
   ASSERT_EQ(GenerationOf(*engine), 2u);
   AddRecord(*engine, 2);
   EXPECT_TRUE(isFlushed);
+}
+
+// The disk has room for it then, and a commit in it is found by its name.
+TEST_F(CommitLogFaults, ALogIsOnTheDiskBeforeTheCommitThatMakesIt) {
+  { AddRecord(*OpenSpace(space()), 2); }
+  fs::remove(file(kLogFile));
+  const auto engine = OpenSpace(space());
+  AddRecord(*engine, 3);
+  std::vector<std::string> synced;
+  const WatchedDisk disk(
+      [&](const WatchedDisk::Write& write) {
+        if (IsMetaPage(write)) synced.push_back("the commit");
+        return 0;
+      },
+      [&](const std::string& name) {
+        if (name != kDataFile) synced.push_back(name);
+      });
+  Edit(*engine, 4, 2);
+  const std::string parent = space().parent_path().filename().string();
+  EXPECT_EQ(synced, (std::vector<std::string>{kUnfinishedLogFile, "space", parent, "the commit"}));
+}
+
+// Without it the space would be refused, which might have had commits there.
+TEST_F(CommitLogFaults, ALogThatWasMadeWithoutSyncingIsOnTheDiskBeforeTheNextCommit) {
+  { AddRecord(*OpenSpace(space()), 2); }
+  fs::remove(file(kLogFile));
+  ChildProcess unsynced([&](const Conversation& parent) {
+    const auto engine = OpenSpace(space(), Syncs::kNothing);
+    Edit(*engine, 3, 3);  // makes the log
+    parent.Say("made");
+    parent.Hear();
+    return true;
+  });
+  ASSERT_EQ(unsynced.Hear(), "made");
+  unsynced.Kill();
+  const auto engine = OpenSpace(space());
+  bool isNameSynced = false;
+  const WatchedDisk disk(
+      [&](const WatchedDisk::Write& write) {
+        EXPECT_TRUE(isNameSynced || !IsMetaPage(write));
+        return 0;
+      },
+      [&](const std::string& name) { isNameSynced = isNameSynced || name == "space"; });
+  AddRecord(*engine, 4);
+  EXPECT_TRUE(isNameSynced);
 }
 
 TEST_F(CommitLogFaults, ALogThatCannotBeMadeIsDoneWithout) {
@@ -468,6 +556,7 @@ TEST_F(CommitLogFaults, ALogThatCannotBeMadeIsDoneWithout) {
       EXPECT_TRUE(disk.HasFailed());
     }
     EXPECT_EQ(openFiles(), before);
+    EXPECT_FALSE(fs::exists(file(kUnfinishedLogFile)));
     EXPECT_EQ(EditedIn(*engine), EditedRecord(kEdited, 10 + static_cast<std::uint64_t>(nth)));
   }
 }

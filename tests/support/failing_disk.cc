@@ -74,6 +74,7 @@ int fdatasync(int file) {
 }
 int fsync(int file) {
   static const auto next = Next<int (*)(int)>("fsync");
+  if (g_beforeSync) g_beforeSync(NameOf(file));
   return FailOr<int>([&] { return next(file); });
 }
 

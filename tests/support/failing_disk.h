@@ -32,7 +32,7 @@ class WatchedDisk {
     off_t offset;
   };
   // `afterWrite` is called after each pwrite that was done, and returns 0 or the errno with which it is to fail all the same;
-  // `beforeSync` before each fdatasync, with the name of the file.
+  // `beforeSync` before each fdatasync and fsync, with the name of the file or folder.
   explicit WatchedDisk(std::function<int(const Write&)> afterWrite, std::function<void(const std::string&)> beforeSync = {});
   ~WatchedDisk();
   WatchedDisk(const WatchedDisk&) = delete;
