@@ -25,8 +25,7 @@ struct TVectorDeletionInterval {
 
   void Serialise(Archive& ar) const {
     ar << m_opid;
-    SerialiseVariableLengthUint(ar, m_q);
-    SerialiseVariableLengthUint(ar, m_n);
+    SerialiseVariableLengthUints(ar, m_q, m_n);
   }
   void Deserialise(InputArchive& ar) {
     ar >> m_opid;

@@ -26,9 +26,7 @@ struct TVectorInsertionInterval {
 
   void Serialise(Archive& ar) const {
     ar << m_opid;
-    SerialiseVariableLengthUint(ar, m_q);
-    SerialiseVariableLengthUint(ar, m_n);
-    SerialiseVariableLengthUint(ar, m_u);
+    SerialiseVariableLengthUints(ar, m_q, m_n, m_u);
   }
   void Deserialise(InputArchive& ar) {
     ar >> m_opid;
@@ -61,6 +59,8 @@ class TVectorInsertions {
     DeserialiseVariableLengthUint(ar, m_u2);
     ar >> m_c;
   }
+
+  [[gnu::always_inline]] void PrefetchNode(int n) const noexcept { m_c.PrefetchNode(n); }
 
   // Compares the runs alone.
   friend bool operator==(const TVectorInsertions& a, const TVectorInsertions& b) { return a.m_c == b.m_c; }

@@ -14,6 +14,12 @@ class TVectorInsertionsAndDeletions {
   void Serialise(Archive& ar) const { ar << m_insertions << m_deletions; }
   void Deserialise(InputArchive& ar) { ar >> m_insertions >> m_deletions; }
 
+  // Node `n` of both lists.
+  [[gnu::always_inline]] void PrefetchNode(int n) const noexcept {
+    m_insertions.PrefetchNode(n);
+    m_deletions.PrefetchNode(n);
+  }
+
   friend bool operator==(const TVectorInsertionsAndDeletions& a, const TVectorInsertionsAndDeletions& b) {
     return a.m_insertions == b.m_insertions && a.m_deletions == b.m_deletions;
   }

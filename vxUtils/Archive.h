@@ -114,6 +114,17 @@ void SerialiseVariableLengthUint(Archive& ar, T value) {
   ar.EndWrite(p);
 }
 
+// The same for several values, with one look at the room in the buffer.
+template <class... T>
+void SerialiseVariableLengthUints(Archive& ar, T... values) {
+  if (std::uint8_t* p = ar.BeginWriteIfRoom(sizeof...(values) * MAX_VARIABLE_LENGTH_UINT_SIZE)) {
+    ((p = SerialiseVariableLengthInteger(p, values)), ...);
+    ar.EndWrite(p);
+  } else {
+    (SerialiseVariableLengthUint(ar, values), ...);
+  }
+}
+
 // Reads a 32-bit value, zero-extended: what was written from -1 is 4294967295.
 template <class T>
 const std::uint8_t* DeserialiseVariableLengthInteger(const std::uint8_t* p, T& value) noexcept {

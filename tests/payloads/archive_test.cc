@@ -145,6 +145,29 @@ TEST_F(ArchiveTest, BytesSplitByFlushesArriveInOrder) {
   EXPECT_EQ(stream.m_bytes, expected);
 }
 
+// Wherever the buffer ends, as bytes and in pieces.
+TEST(Archive, SeveralValuesAtOnceAreWrittenAsOneByOne) {
+  for (ssize_t filled = ARCHIVE_BUFSIZE - 20; filled <= ARCHIVE_BUFSIZE; ++filled) {
+    const auto write = [&](PieceStream& stream, bool atOnce) {
+      Archive ar(&stream);
+      for (ssize_t i = 0; i < filled; ++i) SerialiseVariableLengthUint(ar, 1);
+      if (atOnce) {
+        SerialiseVariableLengthUints(ar, ssize_t{-1}, 300, ssize_t{7});
+      } else {
+        SerialiseVariableLengthUint(ar, ssize_t{-1});
+        SerialiseVariableLengthUint(ar, 300);
+        SerialiseVariableLengthUint(ar, ssize_t{7});
+      }
+      ar.Flush();
+    };
+    PieceStream atOnce, oneByOne;
+    write(atOnce, true);
+    write(oneByOne, false);
+    EXPECT_EQ(atOnce.m_bytes, oneByOne.m_bytes) << filled;
+    EXPECT_EQ(atOnce.m_pieces, oneByOne.m_pieces) << filled;
+  }
+}
+
 TEST(Archive, ItsDestructorWritesNothing) {
   BytesOutputStream stream;
   {
