@@ -1,8 +1,10 @@
 #include "engines/record_delta.h"
 
 #include <algorithm>
+#include <array>
 #include <bit>
 #include <cstring>
+#include <utility>
 
 #include "platform/error.h"
 #include "platform/variable_length.h"
@@ -14,10 +16,16 @@ namespace {
 
 // Stretches that agree in so many bytes are taken to be the same.
 constexpr std::size_t kAnchorBytes = 8;
-// How far from where two versions part they are compared at every pair of distances.
+// How far from where two versions part they are looked at for a stretch that has kept its length.
 constexpr std::size_t kNearBytes = 24;
 // How far the one may have grown or shrunk against the other.
 constexpr std::size_t kFarBytes = 1024;
+// How far from where two versions part a stretch may be that is in both behind others that are not, and how long it must be:
+// shorter ones recur, as the site of an operation does.
+constexpr std::size_t kWindowBytes = 256;
+constexpr std::size_t kSureBytes = 2 * kAnchorBytes;
+// Stretches that are replaced as they are: what they might share is not worth the search.
+constexpr std::size_t kShortBytes = 48;
 // What a delta of a few changes fits in.
 constexpr std::size_t kUsualBytes = 256;
 
@@ -43,11 +51,25 @@ std::size_t CommonPrefix(ByteView a, ByteView b) noexcept {
   return n;
 }
 
-// Where `needle`'s first bytes stand in the first kFarBytes of `bytes`.
+std::size_t CommonSuffix(ByteView a, ByteView b) noexcept {
+  const std::size_t most = std::min(a.size(), b.size());
+  std::size_t n = 0;
+  for (; n + kAnchorBytes <= most; n += kAnchorBytes) {
+    const std::uint64_t differ = Anchor(a, a.size() - n - kAnchorBytes) ^ Anchor(b, b.size() - n - kAnchorBytes);
+    if (differ != 0) return n + static_cast<std::size_t>(std::countl_zero(differ)) / 8;
+  }
+  while (n < most && a[a.size() - n - 1] == b[b.size() - n - 1]) ++n;
+  return n;
+}
+
+// Where `needle`'s first bytes stand in the first kFarBytes of `bytes`; both have at least kAnchorBytes.
 std::optional<std::size_t> FindAnchor(ByteView bytes, ByteView needle) noexcept {
-  const void* found = ::memmem(bytes.data(), std::min(bytes.size(), kFarBytes), needle.data(), kAnchorBytes);
-  if (found == nullptr) return std::nullopt;
-  return static_cast<std::size_t>(static_cast<const std::uint8_t*>(found) - bytes.data());
+  const std::uint64_t wanted = Anchor(needle, 0);
+  const std::size_t last = std::min(bytes.size(), kFarBytes) - kAnchorBytes;
+  for (std::size_t at = 0; at <= last; ++at) {
+    if (Anchor(bytes, at) == wanted) return at;
+  }
+  return std::nullopt;
 }
 
 struct Gap {
@@ -55,59 +77,98 @@ struct Gap {
   std::size_t added;
 };
 
+// Both have at least kAnchorBytes.
+std::optional<Gap> FindSharedStretch(ByteView old, ByteView next) noexcept {
+  constexpr int kSlotBits = 9;
+  std::array<std::uint16_t, std::size_t{1} << kSlotBits> places{};  // of anchors in `old`, counted from 1, by their hash
+  const auto place = [&](std::uint64_t anchor) -> std::uint16_t& {
+    return places[anchor * 0x9E3779B97F4A7C15 >> (64 - kSlotBits)];  // Knuth's multiplicative hashing, by the golden ratio
+  };
+  const auto range = [](ByteView bytes) { return std::min(kWindowBytes, bytes.size() - kAnchorBytes + 1); };
+  for (std::size_t i = range(old); i > 0; --i) place(Anchor(old, i - 1)) = static_cast<std::uint16_t>(i);
+  for (std::size_t added = 0; added < range(next); ++added) {
+    const std::size_t found = place(Anchor(next, added));
+    if (found == 0) continue;
+    const ByteView oldRest = old.subspan(found - 1), nextRest = next.subspan(added);
+    if (CommonPrefix(oldRest, nextRest) >= std::min({kSureBytes, oldRest.size(), nextRest.size()})) return Gap{found - 1, added};
+  }
+  return std::nullopt;
+}
+
 // How much of each side to skip until they agree again: all of both where they do not. Looks first for what has kept its length,
 // as most of what is overwritten has, then for what came or went, as entries do, and then for what did both.
 Gap FindGap(ByteView old, ByteView next) noexcept {
   if (old.size() >= kAnchorBytes && next.size() >= kAnchorBytes) {
-    const std::size_t oldRange = std::min(kNearBytes, old.size() - kAnchorBytes);
-    const std::size_t nextRange = std::min(kNearBytes, next.size() - kAnchorBytes);
-    for (std::size_t both = 1; both <= std::min(oldRange, nextRange); ++both) {
+    const std::size_t near = std::min({kNearBytes, old.size() - kAnchorBytes, next.size() - kAnchorBytes});
+    for (std::size_t both = 1; both <= near; ++both) {
       if (Anchor(old, both) == Anchor(next, both)) return {both, both};
-    }
-    const std::uint64_t oldStart = Anchor(old, 0), nextStart = Anchor(next, 0);
-    for (std::size_t added = 1; added <= nextRange; ++added) {
-      if (Anchor(next, added) == oldStart) return {0, added};
-    }
-    for (std::size_t dropped = 1; dropped <= oldRange; ++dropped) {
-      if (Anchor(old, dropped) == nextStart) return {dropped, 0};
-    }
-    for (std::size_t sum = 1; sum <= oldRange + nextRange; ++sum) {
-      for (std::size_t dropped = sum > nextRange ? sum - nextRange : 0; dropped <= std::min(sum, oldRange); ++dropped) {
-        if (Anchor(old, dropped) == Anchor(next, sum - dropped)) return {dropped, sum - dropped};
-      }
     }
     if (const auto added = FindAnchor(next, old)) return {0, *added};
     if (const auto dropped = FindAnchor(old, next)) return {*dropped, 0};
+    if (const auto gap = FindSharedStretch(old, next)) return *gap;
   }
   return {old.size(), next.size()};
 }
 
-void AppendStep(Bytes& delta, std::size_t kept, const Gap& gap, ByteView next) {
-  std::uint8_t head[3 * kMaxVariableLengthUint64Bytes];
-  std::uint8_t* p = SerialiseVariableLengthUint64(head, kept);
-  p = SerialiseVariableLengthUint64(p, gap.dropped);
-  p = SerialiseVariableLengthUint64(p, gap.added);
-  delta.insert(delta.end(), head, p);
-  delta.insert(delta.end(), next.begin(), next.begin() + static_cast<std::ptrdiff_t>(gap.added));
+class DeltaWriter {
+ public:
+  explicit DeltaWriter(std::size_t mostBytes) : m_mostBytes(mostBytes) { m_delta.reserve(std::min(mostBytes, kUsualBytes)); }
+
+  void Keep(std::size_t bytes) noexcept { m_kept += bytes; }
+  // False where the delta would be too long.
+  bool Replace(std::size_t dropped, ByteView added) {
+    std::uint8_t head[3 * kMaxVariableLengthUint64Bytes];
+    std::uint8_t* p = SerialiseVariableLengthUint64(head, std::exchange(m_kept, 0));
+    p = SerialiseVariableLengthUint64(p, dropped);
+    p = SerialiseVariableLengthUint64(p, added.size());
+    if (m_delta.size() + static_cast<std::size_t>(p - head) + added.size() > m_mostBytes) return false;
+    m_delta.insert(m_delta.end(), head, p);
+    m_delta.insert(m_delta.end(), added.begin(), added.end());
+    return true;
+  }
+  Bytes Take() noexcept { return std::move(m_delta); }
+
+ private:
+  std::size_t m_mostBytes;
+  std::size_t m_kept = 0;
+  Bytes m_delta;
+};
+
+// All but the last bytes, which a record has for its checksum: they always differ.
+ByteView WithoutChecksum(ByteView record) noexcept {
+  constexpr std::size_t kChecksumBytes = 8;
+  return record.first(record.size() - std::min(record.size(), kChecksumBytes));
+}
+
+// What stands between the parts that both begin and end with.
+bool WriteMiddle(ByteView old, ByteView next, DeltaWriter& delta) {
+  for (;;) {
+    const std::size_t kept = CommonPrefix(old, next);
+    delta.Keep(kept);
+    old = old.subspan(kept);
+    next = next.subspan(kept);
+    if (old.empty() && next.empty()) return true;
+    const bool isShort = old.size() <= kShortBytes && next.size() <= kShortBytes;
+    const Gap gap = isShort ? Gap{old.size(), next.size()} : FindGap(old, next);
+    if (!delta.Replace(gap.dropped, next.first(gap.added))) return false;
+    old = old.subspan(gap.dropped);
+    next = next.subspan(gap.added);
+  }
 }
 
 }  // namespace
 
 std::optional<Bytes> RecordDelta(ByteView old, ByteView next, std::size_t mostBytes) {
-  Bytes delta;
-  delta.reserve(std::min(mostBytes, kUsualBytes));
-  for (;;) {
-    const std::size_t kept = CommonPrefix(old, next);
-    old = old.subspan(kept);
-    next = next.subspan(kept);
-    if (old.empty() && next.empty()) return delta;
-    const Gap gap = FindGap(old, next);
-    if (delta.size() + gap.added > mostBytes) return std::nullopt;
-    AppendStep(delta, kept, gap, next);
-    if (delta.size() > mostBytes) return std::nullopt;
-    old = old.subspan(gap.dropped);
-    next = next.subspan(gap.added);
-  }
+  DeltaWriter delta(mostBytes);
+  const ByteView oldBody = WithoutChecksum(old), nextBody = WithoutChecksum(next);
+  const std::size_t prefix = CommonPrefix(oldBody, nextBody);
+  const ByteView oldRest = oldBody.subspan(prefix), nextRest = nextBody.subspan(prefix);
+  const std::size_t suffix = CommonSuffix(oldRest, nextRest);
+  delta.Keep(prefix);
+  if (!WriteMiddle(oldRest.first(oldRest.size() - suffix), nextRest.first(nextRest.size() - suffix), delta)) return std::nullopt;
+  delta.Keep(suffix);
+  if (!WriteMiddle(old.subspan(oldBody.size()), next.subspan(nextBody.size()), delta)) return std::nullopt;
+  return delta.Take();
 }
 
 Bytes ApplyRecordDelta(ByteView old, ByteView delta) {

@@ -2,8 +2,10 @@
 
 #include <gtest/gtest.h>
 
+#include <algorithm>
 #include <random>
 #include <string>
+#include <vector>
 
 #include "platform/error.h"
 #include "tests/support/seed.h"
@@ -63,6 +65,57 @@ TEST(RecordDelta, SeesAStretchThatGrewByAFewBytes) {
   next.erase(next.begin() + 300, next.begin() + 304);
   next.insert(next.begin() + 300, longer.begin(), longer.end());
   EXPECT_LE(DeltaSize(old, next), 24u);
+}
+
+// Behind the change stands another, so that the ends of the records tell nothing.
+TEST(RecordDelta, SeesALongStretchThatWasReplacedByALongerOne) {
+  std::mt19937_64 random(5);
+  const Bytes old = RandomBytes(random, 2000);
+  Bytes next = old;
+  next[1500] ^= 0x55;
+  const Bytes longer = RandomBytes(random, 100);
+  next.erase(next.begin() + 300, next.begin() + 370);
+  next.insert(next.begin() + 300, longer.begin(), longer.end());
+  EXPECT_LE(DeltaSize(old, next), 115u);
+  EXPECT_LE(DeltaSize(next, old), 85u);
+}
+
+// As the site of an operation recurs in every entry that names one.
+TEST(RecordDelta, IsNotMisledByWhatRecurs) {
+  std::mt19937_64 random(6);
+  const Bytes site = RandomBytes(random, 12);
+  const auto entry = [&](std::size_t sites) {
+    Bytes bytes = RandomBytes(random, 12);
+    for (; sites > 0; --sites) {
+      bytes.insert(bytes.end(), site.begin(), site.end());
+      const Bytes number = RandomBytes(random, 4);
+      bytes.insert(bytes.end(), number.begin(), number.end());
+    }
+    return bytes;
+  };
+  std::vector<Bytes> entries;
+  for (std::size_t i = 0; i < 60; ++i) entries.push_back(entry(1 + i % 3));
+  const auto joined = [&] {
+    Bytes all;
+    for (const Bytes& bytes : entries) all.insert(all.end(), bytes.begin(), bytes.end());
+    return all;
+  };
+  const Bytes old = joined();
+  entries[20] = entry(3);  // in the place of one that names a site three times, and of one that does so once
+  entries[30] = entry(3);
+  entries[40][0] ^= 0x55;
+  EXPECT_LE(DeltaSize(old, joined()), 110u);
+}
+
+// A record ends with a checksum, so that the last bytes differ whatever has changed.
+TEST(RecordDelta, OfOneChangeBeforeAChecksumIsTwoSteps) {
+  std::mt19937_64 random(7);
+  const Bytes old = RandomBytes(random, 1000);
+  Bytes next = old;
+  const Bytes changed = RandomBytes(random, 400);
+  std::copy(changed.begin(), changed.end(), next.begin() + 500);
+  for (std::size_t i = 992; i < 1000; ++i) next[i] ^= 0x55;
+  EXPECT_EQ(DeltaSize(old, next), 400u + 6u + 8u + 3u);
 }
 
 TEST(RecordDelta, IsRefusedWhereItWouldBeTooLong) {
