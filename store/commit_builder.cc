@@ -79,10 +79,12 @@ void CommitBuilder::Add(OID oid, ptr<IPersistable> object) {
   while (!pending.empty()) {
     const auto [id, current] = pending.back();
     pending.pop_back();
-    if (!m_written.insert(id).second) continue;
+    const auto [written, isNew] = m_written.emplace(id, 0);
+    if (!isNew) continue;
     ReferenceCheck check(m_view, m_space, m_deletedIds, id);
     current.Table()->_IObject.VisitObjects(current.m_self, check);
     Encode(id, current);
+    written->second = Residents::Measure(current);  // now, while it is in the processor's cache
     for (const prefbase& reference : OwnedReferences(current)) {
       if (m_newIds.contains(reference.m_oid)) pending.emplace_back(reference.m_oid, m_view.Find(reference.m_oid));
     }

@@ -32,7 +32,8 @@ class CommitBuilder {
   CommitBatch& Finish();
 
   CommitBatch& Batch() noexcept { return m_batch; }
-  const std::unordered_set<OID>& Written() const noexcept { return m_written; }
+  // What is written, and how much memory each takes (Residents::Measure).
+  const std::unordered_map<OID, std::size_t>& Written() const noexcept { return m_written; }
 
  private:
   struct Extent {
@@ -48,7 +49,7 @@ class CommitBuilder {
   const CSpace& m_space;
   const std::unordered_set<OID>& m_newIds;
   const std::unordered_set<OID>& m_deletedIds;
-  std::unordered_set<OID> m_written;
+  std::unordered_map<OID, std::size_t> m_written;
   Bytes m_bytes;
   std::vector<Extent> m_extents;
   CommitBatch m_batch;

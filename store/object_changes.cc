@@ -69,7 +69,7 @@ void ObjectChanges::AddRemovedTo(CommitBatch& batch) const {
   batch.queuedDeletions.insert(batch.queuedDeletions.end(), m_queuedDeletions.begin(), m_queuedDeletions.end());
 }
 
-void ObjectChanges::Committed(std::uint64_t generation, const std::unordered_set<OID>& written) noexcept {
+void ObjectChanges::Committed(std::uint64_t generation, const std::unordered_map<OID, std::size_t>& written) noexcept {
   for (const auto& [oid, object] : m_dirty) SysStateOf(object).ClearFlag(ObjSysState::kDirtyFlag);
   for (const OID oid : m_new) {
     if (written.contains(oid)) continue;
@@ -77,7 +77,7 @@ void ObjectChanges::Committed(std::uint64_t generation, const std::unordered_set
     m_view.Release(oid);
     DestroyObject(unreached);
   }
-  for (const OID oid : written) m_view.Written(oid, generation);
+  for (const auto& [oid, bytes] : written) m_view.Written(oid, generation, bytes);
   m_dirty.clear();
   m_new.clear();
 }

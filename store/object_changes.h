@@ -46,7 +46,7 @@ class ObjectChanges {
   void AddRemovedTo(CommitBatch& batch) const;
 
   // The engine has said yes: what was written is clean, and what no root reaches is dropped.
-  void Committed(std::uint64_t generation, const std::unordered_set<OID>& written) noexcept;
+  void Committed(std::uint64_t generation, const std::unordered_map<OID, std::size_t>& written) noexcept;
   // Ends what was deleted.
   void EndDeleted() noexcept;
 

@@ -80,12 +80,12 @@ void Residents::MarkedDirty(OID oid) noexcept {
   Count(found->second);
 }
 
-void Residents::Written(OID oid, std::uint64_t commit) noexcept {
+void Residents::Written(OID oid, std::uint64_t commit, std::size_t bytes) noexcept {
   const auto found = m_table.find(oid);
   if (found == m_table.end()) return;
   Uncount(found->second);
   found->second.commit = commit;
-  found->second.bytes = Measure(found->second.object);
+  found->second.bytes = bytes;
   found->second.state = State::kClean;
   Count(found->second);
 }

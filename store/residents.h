@@ -52,6 +52,9 @@ class Residents {
   // Without what the open transaction pins: what a choice can take.
   std::size_t EvictableBytes() const noexcept { return m_bytes - m_pinnedBytes; }
 
+  // What an object takes in memory, with what this table keeps about it. Linear in its entries and their records.
+  static std::size_t Measure(ptr<IPersistable> object) noexcept;
+
   // Null when it is not here.
   ptr<IPersistable> Find(OID oid) const noexcept;
   // The same for a reference that is about to be bound: a cooling object stays.
@@ -61,8 +64,8 @@ class Residents {
   void Add(OID oid, ptr<IPersistable> object, std::uint64_t commit);
   // A clean or cooling one is dirty from now on. One that is not here (a root map) is no concern of this table's.
   void MarkedDirty(OID oid) noexcept;
-  // A new or dirty one is clean from now on, as `commit` wrote it, and is measured again.
-  void Written(OID oid, std::uint64_t commit) noexcept;
+  // A new or dirty one is clean from now on, as `commit` wrote it; it takes `bytes`, as Measure says.
+  void Written(OID oid, std::uint64_t commit, std::size_t bytes) noexcept;
   // Lets go of one without ending it.
   void Remove(OID oid) noexcept;
   // Lets go of all; the caller ends the objects.
@@ -81,7 +84,6 @@ class Residents {
   const Table& All() const noexcept { return m_table; }
 
  private:
-  static std::size_t Measure(ptr<IPersistable> object) noexcept;
   static bool IsPinned(State state) noexcept { return state == State::kNew || state == State::kDirty; }
   void Count(const Resident& resident) noexcept;
   void Uncount(const Resident& resident) noexcept;

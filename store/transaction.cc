@@ -348,7 +348,7 @@ void WriteTransaction::Reattach() noexcept {
   m_poisoned = true;
 }
 
-void WriteTransaction::AfterCommit(std::uint64_t generation, const std::unordered_set<OID>& written) noexcept {
+void WriteTransaction::AfterCommit(std::uint64_t generation, const std::unordered_map<OID, std::size_t>& written) noexcept {
   vemo::View& view = m_space.m_writerView;
   m_objects.Committed(generation, written);
   for (auto& [name, root] : view.Roots().All()) root.committed = !root.oid.IsNull();

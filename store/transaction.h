@@ -147,7 +147,7 @@ class WriteTransaction {
   bool HasChanges() const noexcept;
   void AddChanged(CommitBuilder& builder) const;
   void Reattach() noexcept;
-  void AfterCommit(std::uint64_t generation, const std::unordered_set<OID>& written) noexcept;
+  void AfterCommit(std::uint64_t generation, const std::unordered_map<OID, std::size_t>& written) noexcept;
   void Finish() noexcept;
   void RequireOpen() const;
   void RequireThisProcess() const;

@@ -96,7 +96,7 @@ class View {
   void Release(OID oid) noexcept;
   // A resident was marked, or was written by that commit.
   void MarkedDirty(OID oid) noexcept { m_residents.MarkedDirty(oid); }
-  void Written(OID oid, std::uint64_t commit) noexcept { m_residents.Written(oid, commit); }
+  void Written(OID oid, std::uint64_t commit, std::size_t bytes) noexcept { m_residents.Written(oid, commit, bytes); }
 
   // What the residents take that nothing pins.
   std::size_t EvictableBytes() const noexcept { return m_residents.EvictableBytes(); }
