@@ -38,8 +38,15 @@ bool PageFile::Map(std::uint64_t bytes) {
   m_maps.reserve(m_maps.size() + 1);
   void* map = ::mmap(nullptr, bytes, PROT_READ, MAP_SHARED, m_file, 0);
   if (map == MAP_FAILED) return false;
+  if (!m_readsAhead) ::madvise(map, bytes, MADV_RANDOM);  // a hint: where it fails, the rest is the same
   m_maps.emplace_back(map, bytes);
   return true;
+}
+
+void PageFile::ReadAhead() noexcept {
+  const std::lock_guard lock(m_mapping);
+  m_readsAhead = true;
+  for (const auto& [map, bytes] : m_maps) ::madvise(map, bytes, MADV_NORMAL);
 }
 
 void PageFile::Unmap(std::size_t count) noexcept {

@@ -29,6 +29,12 @@ class PageFile {
     return AtAfterLooking(offset, bytes);
   }
 
+  // A page is about to be read that the caller has not read before. While these are few, as when a space is opened for a look
+  // at some of its fields, the system reads from the disk what it is asked for and nothing around it; then it may read ahead.
+  void CountReached() noexcept {
+    if (m_reached.load(std::memory_order_relaxed) < kFewPages && m_reached.fetch_add(1) + 1 == kFewPages) ReadAhead();
+  }
+
   // Asks the system anew how long the file is: one that was cut off meanwhile must not be touched there. Returns it.
   std::uint64_t Measure();
 
@@ -37,6 +43,10 @@ class PageFile {
   void Remap(std::uint64_t room);
 
  private:
+  // Opening a space of a million entries and looking at one reaches some twenty-five.
+  static constexpr int kFewPages = 64;
+
+  void ReadAhead() noexcept;
   const std::uint8_t* AtAfterLooking(std::uint64_t offset, std::uint64_t bytes);
   std::uint64_t FileBytes() const;
   bool Map(std::uint64_t bytes);
@@ -46,7 +56,9 @@ class PageFile {
   int m_file = -1;
   const std::string m_space;
   std::uint64_t m_room;
-  std::mutex m_mapping;                              // guards m_maps and changes of the two below
+  std::atomic<int> m_reached{0};
+  std::mutex m_mapping;                               // guards what follows, of the last two the changes
+  bool m_readsAhead = false;
   std::vector<std::pair<void*, std::size_t>> m_maps;  // readers may still be in those before the last
   std::atomic<const std::uint8_t*> m_base{nullptr};
   std::atomic<std::uint64_t> m_readable{0};  // bytes that are both in the file and mapped at m_base

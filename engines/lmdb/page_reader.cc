@@ -59,6 +59,7 @@ PageView PageReader::EnterFirst(PageNumber number, std::uint64_t place, bool isL
   if (chunk == nullptr) chunk = std::make_unique<std::uint64_t[]>(kMarksInChunk);
   std::uint64_t& mark = chunk[number % kMarksInChunk];
   if (mark != 0 && mark != place) Fail(number, table, "it is reached from two places", bounds);
+  m_file->CountReached();
   const std::uint8_t* bytes = m_file->At(number * m_pageBytes, m_pageBytes);
   if (bytes == nullptr) Fail(number, table, "the file ends before it", bounds);
   PageRole role{number, isLeaf, table.order, table.isMain, 1, bounds};
@@ -74,6 +75,7 @@ ByteView PageReader::Run(PageNumber first, std::size_t bytes, const PageTable& t
   const KeyBounds lost{key, key};
   const std::uint64_t pages = RunPages(bytes, m_pageBytes);
   if (const char* fault = FaultOfPlace(first, pages)) Fail(first, table, fault, lost);
+  m_file->CountReached();
   const std::uint8_t* run = m_file->At(first * m_pageBytes, kPageHeaderBytes + bytes);
   if (run == nullptr) Fail(first, table, "the file ends before it", lost);
   const bool mayBeLonger = table.order == KeyOrder::kNumbers;
