@@ -7,6 +7,7 @@
 #include "platform/assertion.h"
 #include "platform/iterator.h"
 #include "platform/types.h"
+#include "vxOperation/src/WorkingSet/CompOp/FieldMapPrefetch.h"
 
 namespace vemo {
 
@@ -27,8 +28,10 @@ struct FieldMapIteratorPolicy {
       if (Leaf* following = m_leaf->m_next.Get()) {
         *this = {following, 0};
         PrefetchBehind(following);
+        PrefetchFirstLists(*following);
       }
     }
+    PrefetchListsAhead(*m_leaf, m_offset);
   }
 
   // Before the first entry of the map it stops at offset -1 of the first leaf, from where next() comes back.

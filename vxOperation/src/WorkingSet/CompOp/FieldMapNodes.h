@@ -134,13 +134,6 @@ class TFieldMapLeafNode : public PersistableMixin<IObjectBaseMixin<typename Trai
   cref<typename Traits::LeafNode> m_next;
   ssize_t m_numKeyEntrys = 0;
   EntrySlots<KeyEntry, Traits::kCapacity> m_entrys;
-
- private:
-  static constexpr int kPrefetchNodes = 3;         // of each list
-  static constexpr ssize_t kPrefetchDistance = 4;  // entries from one of them to the next
-  static constexpr ssize_t kPrefetchAhead = kPrefetchNodes * kPrefetchDistance;
-
-  [[gnu::always_inline]] void PrefetchListsAhead(ssize_t i) const noexcept;
 };
 
 // Moves entries to another node, or within one where the ranges may overlap. They arrive as they lie in memory; where they

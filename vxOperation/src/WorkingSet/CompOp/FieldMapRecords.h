@@ -15,6 +15,7 @@
 #include <utility>
 
 #include "vxOperation/src/WorkingSet/CompOp/FieldMap.h"
+#include "vxOperation/src/WorkingSet/CompOp/FieldMapPrefetch.h"
 #include "platform/assertion.h"
 #include "vxUtils/Archive.h"
 #include "vxUtils/BoundedReader.h"
@@ -91,26 +92,14 @@ void TFieldMapInternalNode<Traits>::VisitPrefs(IPrefVisitor& visitor) const {
 
 // --- Leaves ---
 
-// The nodes of payloads' lists lie apart in memory, each known by the one before alone. Reading them in turn would wait for each
-// of them; so those of the entries ahead of `i` are asked for, the first nodes furthest ahead. `i` begins at -kPrefetchAhead.
-template <class Traits>
-inline void TFieldMapLeafNode<Traits>::PrefetchListsAhead(ssize_t i) const noexcept {
-  if constexpr (requires(const typename Traits::Payload& payload) { payload.PrefetchNode(0); }) {
-    for (int n = 0; n < kPrefetchNodes; ++n) {
-      const ssize_t ahead = i + (kPrefetchNodes - n) * kPrefetchDistance;
-      if (0 <= ahead && ahead < m_numKeyEntrys) GetEntry(ahead).second.PrefetchNode(n);
-    }
-  }
-}
-
 template <class Traits>
 void TFieldMapLeafNode<Traits>::Serialise(Archive& ar) const {
   SerialiseSchema(ar, Traits::kLeafNodeSchema);
   ar << m_prev << m_next;
   SerialiseVariableLengthUint(ar, m_numKeyEntrys);
-  for (ssize_t i = -kPrefetchAhead; i < 0; ++i) PrefetchListsAhead(i);
+  PrefetchFirstLists(*this);
   for (ssize_t i = 0; i < m_numKeyEntrys; ++i) {
-    PrefetchListsAhead(i);
+    PrefetchListsAhead(*this, i);
     ar << GetEntry(i).first << GetEntry(i).second;
   }
 }
