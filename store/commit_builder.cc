@@ -1,5 +1,7 @@
 #include "store/commit_builder.h"
 
+#include <algorithm>
+
 #include "platform/error.h"
 #include "store/decoded_object.h"
 #include "store/envelope.h"
@@ -72,6 +74,13 @@ CommitBuilder::CommitBuilder(View& view, const CSpace& space, const std::unorder
                              const std::unordered_set<OID>& deletedIds)
     : m_view(view), m_space(space), m_newIds(newIds), m_deletedIds(deletedIds) {
   m_batch.expectedGeneration = view.Generation();
+}
+
+void CommitBuilder::Reserve(std::size_t objects) {
+  constexpr std::size_t kUsualRecordBytes = 2'048, kMostBytes = std::size_t{64} << 20;
+  m_written.reserve(m_written.size() + objects);
+  m_extents.reserve(m_extents.size() + objects);
+  m_bytes.reserve(m_bytes.size() + std::min(objects * kUsualRecordBytes, kMostBytes));
 }
 
 void CommitBuilder::Add(OID oid, ptr<IPersistable> object) {

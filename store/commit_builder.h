@@ -20,6 +20,9 @@ class CommitBuilder {
   CommitBuilder(View& view, const CSpace& space, const std::unordered_set<OID>& newIds,
                 const std::unordered_set<OID>& deletedIds);
 
+  // Makes room for that many objects more, so that their records are not copied over and over while more come.
+  void Reserve(std::size_t objects);
+
   // Adds an object and what is new below it. Throws UsageError when one of them refers to a deleted object or to an object
   // of another space or view.
   void Add(OID oid, ptr<IPersistable> object);
