@@ -20,11 +20,11 @@ constexpr std::size_t kAnchorBytes = 8;
 constexpr std::size_t kNearBytes = 24;
 // How far the one may have grown or shrunk against the other.
 constexpr std::size_t kFarBytes = 1024;
-// How far from where two versions part a stretch may be that is in both behind others that are not, and how long it must be:
-// shorter ones recur, as the site of an operation does.
+// How far from where two versions part a stretch may be that is in both behind others that are not.
 constexpr std::size_t kWindowBytes = 256;
-constexpr std::size_t kSureBytes = 2 * kAnchorBytes;
-// Stretches that are replaced as they are: what they might share is not worth the search.
+// How many bytes must agree where a stretch has moved: less recurs, as the 16 bytes of a site do in each list that names it.
+constexpr std::size_t kSureBytes = 24;
+// Stretches that are replaced as they are, where nothing has kept its length: what they might share is not worth the search.
 constexpr std::size_t kShortBytes = 48;
 // What a delta of a few changes fits in.
 constexpr std::size_t kUsualBytes = 256;
@@ -62,12 +62,14 @@ std::size_t CommonSuffix(ByteView a, ByteView b) noexcept {
   return n;
 }
 
-// Where `needle`'s first bytes stand in the first kFarBytes of `bytes`; both have at least kAnchorBytes.
-std::optional<std::size_t> FindAnchor(ByteView bytes, ByteView needle) noexcept {
-  const std::uint64_t wanted = Anchor(needle, 0);
+bool BeginAlike(ByteView a, ByteView b) noexcept { return CommonPrefix(a, b) >= std::min({kSureBytes, a.size(), b.size()}); }
+
+// From where on, in the first kFarBytes of `bytes`, it goes on as `stretch` does; both have at least kAnchorBytes.
+std::optional<std::size_t> FindStretch(ByteView bytes, ByteView stretch) noexcept {
+  const std::uint64_t wanted = Anchor(stretch, 0);
   const std::size_t last = std::min(bytes.size(), kFarBytes) - kAnchorBytes;
   for (std::size_t at = 0; at <= last; ++at) {
-    if (Anchor(bytes, at) == wanted) return at;
+    if (Anchor(bytes, at) == wanted && BeginAlike(bytes.subspan(at), stretch)) return at;
   }
   return std::nullopt;
 }
@@ -88,9 +90,7 @@ std::optional<Gap> FindSharedStretch(ByteView old, ByteView next) noexcept {
   for (std::size_t i = range(old); i > 0; --i) place(Anchor(old, i - 1)) = static_cast<std::uint16_t>(i);
   for (std::size_t added = 0; added < range(next); ++added) {
     const std::size_t found = place(Anchor(next, added));
-    if (found == 0) continue;
-    const ByteView oldRest = old.subspan(found - 1), nextRest = next.subspan(added);
-    if (CommonPrefix(oldRest, nextRest) >= std::min({kSureBytes, oldRest.size(), nextRest.size()})) return Gap{found - 1, added};
+    if (found != 0 && BeginAlike(old.subspan(found - 1), next.subspan(added))) return Gap{found - 1, added};
   }
   return std::nullopt;
 }
@@ -103,8 +103,10 @@ Gap FindGap(ByteView old, ByteView next) noexcept {
     for (std::size_t both = 1; both <= near; ++both) {
       if (Anchor(old, both) == Anchor(next, both)) return {both, both};
     }
-    if (const auto added = FindAnchor(next, old)) return {0, *added};
-    if (const auto dropped = FindAnchor(old, next)) return {*dropped, 0};
+    if (old.size() <= kShortBytes && next.size() <= kShortBytes) return {old.size(), next.size()};
+    const auto added = FindStretch(next, old), dropped = FindStretch(old, next);
+    if (added && (!dropped || *added <= *dropped)) return {0, *added};
+    if (dropped) return {*dropped, 0};
     if (const auto gap = FindSharedStretch(old, next)) return *gap;
   }
   return {old.size(), next.size()};
@@ -148,8 +150,7 @@ bool WriteMiddle(ByteView old, ByteView next, DeltaWriter& delta) {
     old = old.subspan(kept);
     next = next.subspan(kept);
     if (old.empty() && next.empty()) return true;
-    const bool isShort = old.size() <= kShortBytes && next.size() <= kShortBytes;
-    const Gap gap = isShort ? Gap{old.size(), next.size()} : FindGap(old, next);
+    const Gap gap = FindGap(old, next);
     if (!delta.Replace(gap.dropped, next.first(gap.added))) return false;
     old = old.subspan(gap.dropped);
     next = next.subspan(gap.added);

@@ -3,6 +3,7 @@
 #include <gtest/gtest.h>
 
 #include <algorithm>
+#include <array>
 #include <random>
 #include <string>
 #include <vector>
@@ -80,31 +81,74 @@ TEST(RecordDelta, SeesALongStretchThatWasReplacedByALongerOne) {
   EXPECT_LE(DeltaSize(next, old), 85u);
 }
 
-// As the site of an operation recurs in every entry that names one.
+// As the sites of operations recur in the lists of many entries.
+class RecordOfLists {
+ public:
+  explicit RecordOfLists(std::mt19937_64& random) : m_random(random) {
+    for (Bytes& site : m_sites) site = RandomBytes(random, 16);
+    for (std::size_t i = 0; i < 70; ++i) m_entries.push_back({RandomBytes(random, 8), List(1 + i % 3)});
+  }
+
+  void Replace(std::size_t entry, std::size_t intervals) { m_entries[entry].list = List(intervals); }
+  void DropLast(std::size_t entry) { m_entries[entry].list.pop_back(); }
+  void AddInterval(std::size_t entry) { m_entries[entry].list.push_back(Interval()); }
+  void Erase(std::size_t entry) { m_entries.erase(m_entries.begin() + static_cast<std::ptrdiff_t>(entry)); }
+
+  Bytes Join() const {
+    Bytes all;
+    for (const Entry& entry : m_entries) {
+      all.insert(all.end(), entry.key.begin(), entry.key.end());
+      all.push_back(static_cast<std::uint8_t>(entry.list.size()));
+      for (const Bytes& interval : entry.list) all.insert(all.end(), interval.begin(), interval.end());
+    }
+    return all;
+  }
+
+ private:
+  struct Entry {
+    Bytes key;
+    std::vector<Bytes> list;
+  };
+
+  Bytes Interval() {
+    Bytes bytes = m_sites[m_random() % m_sites.size()];
+    const Bytes numbers = RandomBytes(m_random, 5);
+    bytes.insert(bytes.end(), numbers.begin(), numbers.end());
+    return bytes;
+  }
+  std::vector<Bytes> List(std::size_t intervals) {
+    std::vector<Bytes> list(intervals);
+    for (Bytes& interval : list) interval = Interval();
+    return list;
+  }
+
+  std::mt19937_64& m_random;
+  std::array<Bytes, 4> m_sites;
+  std::vector<Entry> m_entries;
+};
+
 TEST(RecordDelta, IsNotMisledByWhatRecurs) {
   std::mt19937_64 random(6);
-  const Bytes site = RandomBytes(random, 12);
-  const auto entry = [&](std::size_t sites) {
-    Bytes bytes = RandomBytes(random, 12);
-    for (; sites > 0; --sites) {
-      bytes.insert(bytes.end(), site.begin(), site.end());
-      const Bytes number = RandomBytes(random, 4);
-      bytes.insert(bytes.end(), number.begin(), number.end());
-    }
-    return bytes;
+  constexpr std::size_t kChanges = 8;
+  const auto deltaOf = [&](auto&& change) {
+    RecordOfLists record(random);
+    const Bytes old = record.Join();
+    for (std::size_t i = kChanges; i-- > 0;) change(record, 8 * i + 2);  // entries of three intervals, and others
+    return DeltaSize(old, record.Join());
   };
-  std::vector<Bytes> entries;
-  for (std::size_t i = 0; i < 60; ++i) entries.push_back(entry(1 + i % 3));
-  const auto joined = [&] {
-    Bytes all;
-    for (const Bytes& bytes : entries) all.insert(all.end(), bytes.begin(), bytes.end());
-    return all;
-  };
-  const Bytes old = joined();
-  entries[20] = entry(3);  // in the place of one that names a site three times, and of one that does so once
-  entries[30] = entry(3);
-  entries[40][0] ^= 0x55;
-  EXPECT_LE(DeltaSize(old, joined()), 110u);
+  EXPECT_LE(deltaOf([](RecordOfLists& record, std::size_t i) { record.DropLast(i); }), kChanges * 10);
+  EXPECT_LE(deltaOf([](RecordOfLists& record, std::size_t i) { record.AddInterval(i); }), kChanges * 34);
+  EXPECT_LE(deltaOf([](RecordOfLists& record, std::size_t i) { record.Erase(i); }), kChanges * 10);
+  EXPECT_LE(deltaOf([](RecordOfLists& record, std::size_t i) { record.Replace(i, 3); }), kChanges * 75);
+}
+
+TEST(RecordDelta, OfSmallChangesInNeighbouringEntriesCostsThose) {
+  std::mt19937_64 random(8);
+  const Bytes old = RandomBytes(random, 1000);
+  Bytes next = old;
+  next[500] ^= 0x55;
+  next[530] ^= 0x55;
+  EXPECT_LE(DeltaSize(old, next), 12u);
 }
 
 // A record ends with a checksum, so that the last bytes differ whatever has changed.
