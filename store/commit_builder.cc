@@ -77,6 +77,7 @@ CommitBuilder::CommitBuilder(View& view, const CSpace& space, const std::unorder
 }
 
 void CommitBuilder::Reserve(std::size_t objects) {
+  // Leaves take one kilobyte with short payloads and four with longer ones. What is not written to costs next to nothing.
   constexpr std::size_t kUsualRecordBytes = 2'048, kMostBytes = std::size_t{64} << 20;
   m_written.reserve(m_written.size() + objects);
   m_extents.reserve(m_extents.size() + objects);

@@ -35,7 +35,7 @@ class CommitBuilder {
   CommitBatch& Finish();
 
   CommitBatch& Batch() noexcept { return m_batch; }
-  // What is written, and how much memory each takes (Residents::Measure).
+  // What is written, and how much memory each takes (Residents::Measure), taken while it was at hand.
   const std::unordered_map<OID, std::size_t>& Written() const noexcept { return m_written; }
 
  private:

@@ -56,7 +56,6 @@ bool ObjectChanges::HasDirtyNodes() const noexcept {
 }
 
 void ObjectChanges::AddDirtyTo(CommitBuilder& builder) const {
-  builder.Reserve(m_dirty.size() + m_new.size());
   for (const auto& [oid, object] : m_dirty) {
     if (!m_new.contains(oid)) builder.Add(oid, object);
   }

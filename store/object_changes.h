@@ -1,6 +1,8 @@
 // The objects that the open transaction has made, marked and deleted.
 #pragma once
 
+#include <algorithm>
+#include <cstddef>
 #include <cstdint>
 #include <unordered_map>
 #include <unordered_set>
@@ -41,6 +43,8 @@ class ObjectChanges {
   const std::unordered_set<OID>& NewIds() const noexcept { return m_new; }
   const std::unordered_set<OID>& DeletedIds() const noexcept { return m_deletedIds; }
 
+  // How many objects a commit writes, to within a factor of two: new ones may be marked as well.
+  std::size_t CountWritten() const noexcept { return std::max(m_dirty.size(), m_new.size()); }
   // Every dirty object that has a record, and what is new below it.
   void AddDirtyTo(CommitBuilder& builder) const;
   void AddRemovedTo(CommitBatch& batch) const;

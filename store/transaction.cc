@@ -303,6 +303,7 @@ void WriteTransaction::Commit() {
 
 // Every dirty object that has a record, every root without one, and what is new below them.
 void WriteTransaction::AddChanged(CommitBuilder& builder) const {
+  builder.Reserve(m_objects.CountWritten());
   for (auto& [name, root] : m_space.m_writerView.Roots().All()) {
     if (root.committed || root.oid.IsNull()) continue;
     builder.Add(root.oid, root.map);
