@@ -90,8 +90,9 @@ class FrontLinkedList {
     delete node;
   }
 
-  // Asks the processor for node `n`, from 0, where there is one. Worth it some time before it is read, once those before it are
-  // at hand. Inlined always, as whoever calls it must be: GCC leaves out calls of functions that do nothing but prefetch.
+  // Asks the processor for node `n`, from 0, where there is one. Worth it some time before it is read, once
+  // those before it, which are read on the way, are at hand. Inlined always, as whoever calls it must be: GCC
+  // leaves out calls of functions that do nothing but prefetch.
   [[gnu::always_inline]] void PrefetchNode(int n) const noexcept {
     const Node* node = m_first;
     for (; node != nullptr && n > 0; --n) node = node->m_next;

@@ -49,7 +49,7 @@ struct LmdbOptions {
 // UsageError, StoreError.
 //
 // - A commit that only changes records and values of NamedTable::kMeta costs one flush of the disk as long as it fits the log
-//   (commit_log.h), every other one two; opening one snapshot costs a microsecond and blocks nobody.
+//   (commit_log.h), every other one two; opening one snapshot costs a microsecond or two and blocks nobody.
 // - A snapshot that stays open keeps the pages it sees from being used again: the file grows with every
 // commit.
 // - The address space is enlarged when it is full and no snapshot of this process is open; otherwise the

@@ -29,8 +29,9 @@ class PageFile {
     return AtAfterLooking(offset, bytes);
   }
 
-  // A page is about to be read that the caller has not read before. While these are few, as when a space is opened for a look
-  // at some of its fields, the system reads from the disk what it is asked for and nothing around it; then it may read ahead.
+  // A page is about to be read. While these are few, as when a space is opened for a look at some of its fields, the system reads
+  // from the disk what it is asked for and nothing around it; then it may read ahead. Readers count the pages that they reach for
+  // the first time, and each big value, so that a page may be counted more than once.
   void CountReached() noexcept {
     if (m_reached.load(std::memory_order_relaxed) < kFewPages && m_reached.fetch_add(1) + 1 == kFewPages) ReadAhead();
   }
@@ -43,7 +44,6 @@ class PageFile {
   void Remap(std::uint64_t room);
 
  private:
-  // Opening a space of a million entries and looking at one reaches some twenty-five.
   static constexpr int kFewPages = 64;
 
   void ReadAhead() noexcept;

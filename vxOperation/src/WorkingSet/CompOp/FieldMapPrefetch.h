@@ -5,7 +5,7 @@
 // for the second ones, to which these lead, of those nearer by, and so on (Chen, Gibbons and Mowry, "Improving Index Performance
 // through Prefetching", SIGMOD 2001).
 //
-// The functions are inlined always: GCC leaves out calls of functions that do nothing but prefetch.
+// The functions are inlined always, for the reason that FrontLinkedList::PrefetchNode has.
 #pragma once
 
 #include "platform/types.h"
