@@ -16,10 +16,12 @@ namespace {
 
 // Stretches that agree in so many bytes are taken to be the same.
 constexpr std::size_t kAnchorBytes = 8;
-// How far from where two versions part they are looked at for a stretch that has kept its length.
+// How far from where two versions part they are looked at for a stretch that has kept its length, and how much both together may
+// be skipped where they are compared at every pair of places.
 constexpr std::size_t kNearBytes = 24;
-// How far the one may have grown or shrunk against the other.
-constexpr std::size_t kFarBytes = 1024;
+constexpr std::size_t kNearSumBytes = 12;
+// How far the one may have grown or shrunk against the other: by an entry with a short payload, or by much more.
+constexpr std::size_t kEntryBytes = 40, kFarBytes = 1024;
 // How far from where two versions part a stretch may be that is in both behind others that are not.
 constexpr std::size_t kWindowBytes = 256;
 // How many bytes must agree where a stretch has moved: less recurs, as the 16 bytes of a site do in each list that names it.
@@ -64,11 +66,10 @@ std::size_t CommonSuffix(ByteView a, ByteView b) noexcept {
 
 bool BeginAlike(ByteView a, ByteView b) noexcept { return CommonPrefix(a, b) >= std::min({kSureBytes, a.size(), b.size()}); }
 
-// From where on, in the first kFarBytes of `bytes`, it goes on as `stretch` does; both have at least kAnchorBytes.
-std::optional<std::size_t> FindStretch(ByteView bytes, ByteView stretch) noexcept {
+// From where on, not behind `most`, `bytes` goes on as `stretch` does; both have at least kAnchorBytes.
+std::optional<std::size_t> FindStretch(ByteView bytes, ByteView stretch, std::size_t most) noexcept {
   const std::uint64_t wanted = Anchor(stretch, 0);
-  const std::size_t last = std::min(bytes.size(), kFarBytes) - kAnchorBytes;
-  for (std::size_t at = 0; at <= last; ++at) {
+  for (std::size_t at = 0; at <= std::min(most, bytes.size() - kAnchorBytes); ++at) {
     if (Anchor(bytes, at) == wanted && BeginAlike(bytes.subspan(at), stretch)) return at;
   }
   return std::nullopt;
@@ -78,6 +79,27 @@ struct Gap {
   std::size_t dropped;
   std::size_t added;
 };
+
+// What came or went alone, up to `most` bytes; both have at least kAnchorBytes.
+std::optional<Gap> FindMove(ByteView old, ByteView next, std::size_t most) noexcept {
+  const auto added = FindStretch(next, old, most), dropped = FindStretch(old, next, added.value_or(most));
+  if (dropped) return Gap{*dropped, 0};
+  if (added) return Gap{0, *added};
+  return std::nullopt;
+}
+
+// The shortest of a few bytes; both have at least kAnchorBytes.
+std::optional<Gap> FindNearGap(ByteView old, ByteView next) noexcept {
+  const std::size_t oldRange = old.size() - kAnchorBytes, nextRange = next.size() - kAnchorBytes;
+  for (std::size_t sum = 1; sum <= std::min(kNearSumBytes, oldRange + nextRange); ++sum) {
+    for (std::size_t dropped = sum > nextRange ? sum - nextRange : 0; dropped <= std::min(sum, oldRange); ++dropped) {
+      const std::size_t added = sum - dropped;
+      if (Anchor(old, dropped) != Anchor(next, added)) continue;
+      if (BeginAlike(old.subspan(dropped), next.subspan(added))) return Gap{dropped, added};
+    }
+  }
+  return std::nullopt;
+}
 
 // Both have at least kAnchorBytes.
 std::optional<Gap> FindSharedStretch(ByteView old, ByteView next) noexcept {
@@ -96,17 +118,18 @@ std::optional<Gap> FindSharedStretch(ByteView old, ByteView next) noexcept {
 }
 
 // How much of each side to skip until they agree again: all of both where they do not. Looks first for what has kept its length,
-// as most of what is overwritten has, then for what came or went, as entries do, and then for what did both.
+// as most of what is overwritten has, then for what came or went, as entries do, then for what has grown or shrunk a little, and
+// then further away.
 Gap FindGap(ByteView old, ByteView next) noexcept {
   if (old.size() >= kAnchorBytes && next.size() >= kAnchorBytes) {
     const std::size_t near = std::min({kNearBytes, old.size() - kAnchorBytes, next.size() - kAnchorBytes});
     for (std::size_t both = 1; both <= near; ++both) {
       if (Anchor(old, both) == Anchor(next, both)) return {both, both};
     }
+    if (const auto gap = FindMove(old, next, kEntryBytes)) return *gap;
+    if (const auto gap = FindNearGap(old, next)) return *gap;
     if (old.size() <= kShortBytes && next.size() <= kShortBytes) return {old.size(), next.size()};
-    const auto added = FindStretch(next, old), dropped = FindStretch(old, next);
-    if (added && (!dropped || *added <= *dropped)) return {0, *added};
-    if (dropped) return {*dropped, 0};
+    if (const auto gap = FindMove(old, next, kFarBytes)) return *gap;
     if (const auto gap = FindSharedStretch(old, next)) return *gap;
   }
   return {old.size(), next.size()};
