@@ -44,7 +44,7 @@ class PageFile {
   void Remap(std::uint64_t room);
 
  private:
-  static constexpr int kFewPages = 64;
+  static constexpr int kFewPages = 256;
 
   void ReadAhead() noexcept;
   const std::uint8_t* AtAfterLooking(std::uint64_t offset, std::uint64_t bytes);

@@ -20,7 +20,7 @@ namespace vemo::test {
 namespace {
 
 constexpr std::uint64_t kFileBytes = std::uint64_t{1} << 20;
-constexpr int kFewPages = 40, kManyPages = 100;
+constexpr int kFewPages = 200, kManyPages = 300;
 
 // Whether the kernel was told to read nothing around the page that is asked for: "rr" among the flags of the
 // map.
@@ -97,7 +97,7 @@ TEST_F(PageFileTest, IsReadAsBeforeWhereItIsMappedAnew) {
 // Records of the first size share pages, those of the second have pages of their own.
 class ReadAheadOfASpace : public testing::TestWithParam<std::size_t> {
  protected:
-  static constexpr std::uint64_t kRecords = 400;
+  static constexpr std::uint64_t kRecords = 1'200;
 
   void SetUp() override {
     if (!TakesAdvice()) GTEST_SKIP() << "the kernel does not tell how it reads what is mapped";
