@@ -16,7 +16,25 @@ namespace {
 
 namespace fs = std::filesystem;
 
-class CommitLogTrust : public LoggedSpace {};
+class CommitLogTrust : public LoggedSpace {
+ protected:
+  // An engine that has made commit 3, and behind it commit 4 of another process, with `name` as it was before that one. Null where
+  // the other process failed.
+  std::unique_ptr<Engine> OpenBehindAnotherProcess(const char* name) const {
+    ChildProcess writer([&](const Conversation& parent) {
+      parent.Hear();
+      Edit(*OpenSpace(space()), 3, 3);
+      return true;
+    });
+    auto engine = OpenSpace(space());
+    Edit(*engine, 2, 2);
+    const std::string before = ReadFile(file(name));
+    writer.Say("go");
+    if (!writer.Succeeded()) return nullptr;
+    WriteFile(file(name), before);
+    return engine;
+  }
+};
 
 TEST_F(CommitLogTrust, AReaderDoesNotSeeACommitThatIsOnItsWayToTheDisk) {
   ChildProcess writer([&](const Conversation& parent) {
@@ -47,33 +65,15 @@ TEST_F(CommitLogTrust, AReaderDoesNotSeeACommitThatIsOnItsWayToTheDisk) {
 
 // Its process ended before it sealed it.
 TEST_F(CommitLogTrust, AnEntryOfAnotherProcessThatWasNotSealedIsNotWrittenOver) {
-  ChildProcess writer([&](const Conversation& parent) {
-    parent.Hear();
-    Edit(*OpenSpace(space()), 3, 3);
-    return true;
-  });
-  const auto engine = OpenSpace(space());
-  Edit(*engine, 2, 2);
-  const std::string seal = ReadFile(file(kSealFile));
-  writer.Say("go");
-  ASSERT_TRUE(writer.Succeeded());
-  WriteFile(file(kSealFile), seal);
+  const auto engine = OpenBehindAnotherProcess(kSealFile);
+  ASSERT_NE(engine, nullptr);
   EXPECT_THROW(Edit(*engine, 3, 77), StaleGeneration);
   EXPECT_EQ(EditedIn(*engine), EditedRecord(kEdited, 3));
 }
 
 TEST_F(CommitLogTrust, AnEntryOfAnotherProcessThatWasSealedAndIsDamagedIsNotWrittenOver) {
-  ChildProcess writer([&](const Conversation& parent) {
-    parent.Hear();
-    Edit(*OpenSpace(space()), 3, 3);
-    return true;
-  });
-  const auto engine = OpenSpace(space());
-  Edit(*engine, 2, 2);
-  const std::string log = ReadFile(file(kLogFile));
-  writer.Say("go");
-  ASSERT_TRUE(writer.Succeeded());
-  WriteFile(file(kLogFile), log);  // which has zeros there
+  const auto engine = OpenBehindAnotherProcess(kLogFile);
+  ASSERT_NE(engine, nullptr);
   EXPECT_THROW(Edit(*engine, 3, 77), StaleGeneration);
   EXPECT_EQ(GenerationOf(*engine), 4u);
   EXPECT_THROW(EditedIn(*engine), DamagedStorage);
