@@ -44,6 +44,7 @@ class PageFile {
   void Remap(std::uint64_t room);
 
  private:
+  // Opening a space reaches some tens of pages, and one at least for each commit that has left changes which wait.
   static constexpr int kFewPages = 256;
 
   void ReadAhead() noexcept;
