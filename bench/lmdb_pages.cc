@@ -1,5 +1,5 @@
 // What checking LMDB's pages costs: random reads of records by the engine and by mdb_get, from one file; the first read of
-// a page in a snapshot; opening a snapshot; commits of one record.
+// a page in a process; opening a snapshot; commits of one record.
 //
 //   lmdb_pages FOLDER [RECORDS]     makes a space of that many records (16,000) of 1,100 bytes in FOLDER
 #include <lmdb.h>
@@ -8,6 +8,7 @@
 #include <chrono>
 #include <cstdio>
 #include <cstdlib>
+#include <memory>
 #include <random>
 #include <string>
 #include <vector>
@@ -45,6 +46,14 @@ double TimeOf(const std::vector<std::uint64_t>& ids, const Read& read) {
     batches.push_back(Nanoseconds(start) / kBatch);
   }
   return Median(std::move(batches));
+}
+
+std::unique_ptr<vemo::Engine> Open(const std::string& folder, bool syncEachCommit) {
+  vemo::LmdbOptions options;
+  options.path = folder;
+  options.create = true;
+  options.syncEachCommit = syncEachCommit;
+  return vemo::OpenLmdbEngine(options);
 }
 
 volatile std::uint8_t g_sink;  // what is read into it must be read
@@ -103,7 +112,7 @@ int main(int argc, char** argv) {
   const std::vector<std::uint64_t> ids = RandomIds(records, 100'000);
   const vemo::Bytes record(1100, 'x');
   {
-    const auto engine = vemo::OpenLmdbEngine({.path = folder, .create = true});
+    const auto engine = Open(folder, true);
     vemo::CommitBatch batch;
     for (std::uint64_t id = 1; id <= records; ++id) batch.records.push_back({vemo::OID(id), record});
     engine->Commit(batch);
@@ -117,13 +126,13 @@ int main(int argc, char** argv) {
     std::printf("opening and closing a snapshot: %.0f ns\n", Median(openings));
     const auto snapshot = engine->OpenSnapshot();
     const std::vector<std::uint64_t> few(ids.begin(), ids.begin() + 2000);
-    std::printf("reading a record, mostly for the first time in the snapshot: %.0f ns\n", ReadByEngine(*snapshot, few));
+    std::printf("reading a record, mostly for the first time: %.0f ns\n", ReadByEngine(*snapshot, few));
     ReadByEngine(*snapshot, ids);
     std::printf("reading a record again: %.0f ns\n", ReadByEngine(*snapshot, ids));
   }
   std::printf("the same by mdb_get: %.0f ns\n", ReadByLmdb(folder, ids));
   {
-    const auto engine = vemo::OpenLmdbEngine({.path = folder, .syncEachCommit = false});
+    const auto engine = Open(folder, false);
     std::printf("a commit that is not synced: %.1f us\n", CommitTime(*engine, ids, record));
   }
 }
