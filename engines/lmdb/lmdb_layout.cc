@@ -74,7 +74,8 @@ std::uint64_t ReadNumber(PageReader& reader, const SpaceState& state, std::strin
   throw IncompatibleSpace("cannot open " + space + ": it is an LMDB environment of another program, not a space");
 }
 
-void CheckLayout(PageReader& reader, const PageTable& system, const std::string& space) {
+void CheckLayout(PageReader& reader, const PageTable& system) {
+  const std::string& space = reader.space();
   TreeCursor cursor(reader, system);
   if (!cursor.Find(kLayoutKey)) ThrowForeign(space);
   const std::string_view value = TextOf(cursor.StoredValue());
@@ -94,13 +95,13 @@ void CheckLayout(PageReader& reader, const PageTable& system, const std::string&
 
 }  // namespace
 
-bool HoldsSpace(const std::shared_ptr<PageFile>& file, const SpaceState& state, const std::string& space) {
+bool HoldsSpace(PageReader& reader, const SpaceState& state) {
+  const std::string& space = reader.space();
   if (state.main.root.flags != 0) ThrowForeign(space);
   if (state.tables.empty() && !state.hasOtherEntries) return false;
   const PageTable* system = state.Table(kSystemTable);
   if (system == nullptr || system->root.flags != 0) ThrowForeign(space);
-  PageReader reader = MakeReader(file, state, space);
-  CheckLayout(reader, *system, space);
+  CheckLayout(reader, *system);
   for (const TableName& name : kTables) {
     const PageTable* table = state.Table(name.name);
     if (table == nullptr || table->root.flags != 0) {

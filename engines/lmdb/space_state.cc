@@ -56,8 +56,8 @@ void CheckMeta(PageFile& file, const MetaPage& meta, const std::string& space) {
 void ReadMain(const std::shared_ptr<PageFile>& file, SpaceState& state, const std::string& space) {
   Digest digest;
   digest.Add(&state.meta, sizeof state.meta);
-  PageReader reader = MakeReader(file, state, space);
-  TreeCursor cursor(reader, state.main);
+  const auto reader = MakeReader(file, state, space);
+  TreeCursor cursor(*reader, state.main);
   unsigned number = kFirstTableNumber;
   for (bool found = cursor.First(); found; found = cursor.Next()) {
     const std::string_view name = cursor.Key();
@@ -213,8 +213,9 @@ std::shared_ptr<const SpaceState> ReadState(const std::shared_ptr<PageFile>& fil
   return state;
 }
 
-PageReader MakeReader(const std::shared_ptr<PageFile>& file, const SpaceState& state, const std::string& space) {
-  return PageReader(file, state.pageBytes, state.meta.lastPage, state.free, space);
+std::unique_ptr<PageReader> MakeReader(const std::shared_ptr<PageFile>& file, const SpaceState& state,
+                                       const std::string& space) {
+  return std::make_unique<PageReader>(file, state.pageBytes, state.meta.lastPage, state.free, space);
 }
 
 }  // namespace vemo
