@@ -1,17 +1,17 @@
 #include "engines/lmdb/lmdb_engine.h"
 
-#include <sys/stat.h>
-
 #include <algorithm>
 #include <cerrno>
 #include <limits>
 #include <map>
 #include <mutex>
+#include <optional>
 #include <string_view>
 #include <utility>
 
 #include "engines/batch_check.h"
 #include "engines/lmdb/change_log.h"
+#include "engines/lmdb/file_status.h"
 #include "engines/lmdb/lmdb_environment.h"
 #include "engines/lmdb/lmdb_error.h"
 #include "engines/lmdb/lmdb_snapshot.h"
@@ -106,12 +106,9 @@ class LmdbEngine final : public Engine {
   EngineUsage Usage() override {
     EngineUsage usage;
     usage.records = m_environment->CountRecords();
-    struct stat status {};
-    if (::stat((m_environment->path() / kDataFile).c_str(), &status) != 0) {
-      throw LmdbError("measure", Name(), errno);
-    }
-    constexpr std::uint64_t kBlockBytes = 512;
-    usage.bytes = static_cast<std::uint64_t>(status.st_blocks) * kBlockBytes + m_environment->LogBytes();
+    const std::optional<FileStatus> status = StatusOf(m_environment->path() / kDataFile);
+    if (!status) throw LmdbError("measure", Name(), errno);
+    usage.bytes = status->diskBytes + m_environment->LogBytes();
     return usage;
   }
 

@@ -1,7 +1,6 @@
 #include "engines/lmdb/log_file.h"
 
 #include <fcntl.h>
-#include <sys/stat.h>
 #include <unistd.h>
 
 #include <cerrno>
@@ -18,32 +17,32 @@ LogFile::LogFile(const std::filesystem::path& folder, const std::string& space, 
     : m_folder(folder), m_path(folder / kLogFile), m_space(space), m_readOnly(readOnly), m_sync(sync) {}
 
 LogFile::~LogFile() {
-  Replace(-1);
+  if (IsOpen()) ::close(m_file);
 }
 
 void LogFile::Replace(int file) noexcept {
   if (m_file >= 0) ::close(m_file);
   m_file = file;
+  m_status = IsOpen() ? StatusOf(m_file) : std::nullopt;
 }
 
+// Once a commit: one call where nothing has changed.
 void LogFile::Open() {
-  if (IsOpen() && IsNamed()) return;
+  if (IsOpen() && m_status) {
+    const std::optional<FileStatus> named = StatusOf(m_path);
+    if (named && named->IsSameFile(*m_status)) {
+      m_status = named;
+      return;
+    }
+  }
   const int flags = (m_readOnly ? O_RDONLY : O_RDWR) | O_CLOEXEC | O_NONBLOCK;
   const int file = ::open(m_path.c_str(), flags);
   if (file < 0 && errno != ENOENT) throw LmdbError(std::string("open ") + kLogFile + " of", m_space, errno);
   Replace(file);
 }
 
-// Whether the name still is that of the file that is open.
-bool LogFile::IsNamed() const noexcept {
-  struct stat open {}, named {};
-  return ::fstat(m_file, &open) == 0 && ::stat(m_path.c_str(), &named) == 0 && open.st_ino == named.st_ino &&
-         open.st_dev == named.st_dev;
-}
-
 bool LogFile::IsWhole() const noexcept {
-  struct stat status {};
-  return IsOpen() && ::fstat(m_file, &status) == 0 && static_cast<std::uint64_t>(status.st_size) >= kLogBytes;
+  return IsOpen() && m_status && m_status->bytes >= kLogBytes;
 }
 
 Bytes LogFile::Read(std::uint64_t from, std::uint64_t to) const {
@@ -86,6 +85,7 @@ bool LogFile::Make() noexcept {
     Replace(file);
     if (Write(zeros, 0) == 0 && (!m_sync || ::fsync(file) == 0) &&
         std::rename(unfinished.c_str(), m_path.c_str()) == 0) {
+      m_status = StatusOf(m_file);
       if (m_sync) SyncName();
       return true;
     }
@@ -108,10 +108,8 @@ void LogFile::SyncAll() const {
 }
 
 std::uint64_t LogFile::DiskBytes() const noexcept {
-  struct stat status {};
-  if (!IsOpen() || ::fstat(m_file, &status) != 0) return 0;
-  constexpr std::uint64_t kBlockBytes = 512;
-  return static_cast<std::uint64_t>(status.st_blocks) * kBlockBytes;
+  const std::optional<FileStatus> status = IsOpen() ? StatusOf(m_file) : std::nullopt;
+  return status ? status->diskBytes : 0;
 }
 
 }  // namespace vemo

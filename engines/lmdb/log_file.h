@@ -5,8 +5,10 @@
 
 #include <cstdint>
 #include <filesystem>
+#include <optional>
 #include <string>
 
+#include "engines/lmdb/file_status.h"
 #include "platform/types.h"
 #include "store/engine.h"
 
@@ -24,7 +26,7 @@ class LogFile {
   // StoreError.
   void Open();
   bool IsOpen() const noexcept { return m_file >= 0; }
-  // Whether the file that is open has all its bytes.
+  // Whether the file that is open had all its bytes at the last Open or Make.
   bool IsWhole() const noexcept;
   bool readOnly() const noexcept { return m_readOnly; }
 
@@ -48,7 +50,6 @@ class LogFile {
 
  private:
   void Replace(int file) noexcept;
-  bool IsNamed() const noexcept;
 
   const std::filesystem::path m_folder;
   const std::filesystem::path m_path;
@@ -56,6 +57,7 @@ class LogFile {
   const bool m_readOnly;
   const bool m_sync;
   int m_file = -1;
+  std::optional<FileStatus> m_status;  // of that file
 };
 
 }  // namespace vemo

@@ -2,12 +2,13 @@
 
 #include <fcntl.h>
 #include <sys/mman.h>
-#include <sys/stat.h>
 #include <unistd.h>
 
 #include <algorithm>
 #include <cerrno>
+#include <optional>
 
+#include "engines/lmdb/file_status.h"
 #include "engines/lmdb/lmdb_error.h"
 
 namespace vemo {
@@ -29,9 +30,9 @@ PageFile::~PageFile() {
 }
 
 std::uint64_t PageFile::FileBytes() const {
-  struct stat status {};
-  if (::fstat(m_file, &status) != 0) throw LmdbError("read", m_space, errno);
-  return static_cast<std::uint64_t>(status.st_size);
+  const std::optional<FileStatus> status = StatusOf(m_file);
+  if (!status) throw LmdbError("read", m_space, errno);
+  return status->bytes;
 }
 
 bool PageFile::Map(std::uint64_t bytes) {
