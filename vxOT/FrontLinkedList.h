@@ -167,8 +167,9 @@ void Deserialise(InputArchive& ar, FrontLinkedList<T, Base, owns>& list) {
   list.Deserialise(ar);
 }
 
+// Inlined always, as the functions of the reader are.
 template <class T, class Base, bool owns>
-void CheckForm(BoundedReader& reader, const FrontLinkedList<T, Base, owns>*) {
+[[gnu::always_inline]] inline void CheckForm(BoundedReader& reader, const FrontLinkedList<T, Base, owns>*) {
   const std::uint32_t n = reader.ReadCount(T::kMinBytes);
   for (std::uint32_t i = 0; i < n; ++i) CheckForm(reader, static_cast<const T*>(nullptr));
 }

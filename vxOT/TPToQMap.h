@@ -268,10 +268,13 @@ void Deserialise(InputArchive& ar, TPtoQMap<T>& map) {
 
 template <class T>
 void CheckForm(BoundedReader& reader, const TPtoQMap<T>*) {
-  const std::uint32_t n = reader.ReadCount(2);
-  for (std::uint32_t i = 0; i < n; ++i) {
-    if (reader.ReadUint32() == 0 && i > 0) reader.Fail("a run of tombstones touches the one before it");
+  std::uint32_t n = reader.ReadCount(2);
+  if (n == 0) return;
+  reader.ReadUint32();  // the first run may begin at once
+  while (true) {
     if (reader.ReadUint32() == 0) reader.Fail("a run of tombstones is empty");
+    if (--n == 0) return;
+    if (reader.ReadUint32() == 0) reader.Fail("a run of tombstones touches the one before it");
   }
 }
 

@@ -1,60 +1,42 @@
 #include "vxUtils/BoundedReader.h"
 
-#include <cstring>
-#include <limits>
+#include <string>
 
 namespace vemo {
 
-std::uint64_t BoundedReader::ReadUint64Slowly() {
-  if (remaining() == 0) Fail("the bytes end where a number should begin");
-  const std::size_t bytes = VariableLengthBytes(*m_at);
-  if (bytes > remaining()) Fail("the bytes end inside a number");
+BoundedReader::Number BoundedReader::ReadLong(const std::uint8_t* begin, const std::uint8_t* at, const std::uint8_t* end,
+                                              std::uint64_t greatest) {
+  if (static_cast<std::size_t>(end - at) >= kMaxVariableLengthUint64Bytes) [[likely]] {
+    const std::size_t bytes = VariableLengthBytes(*at);
+    const std::uint64_t value = DeserialiseVariableLengthUint64FromNine(at, bytes);
+    if (IsShortest(value, bytes) && value <= greatest) [[likely]] return {value, bytes};
+  }
+  return ReadNearEnd(begin, at, end, greatest);
+}
+
+// Never inlined: ReadLong needs no frame then.
+[[gnu::noinline]] BoundedReader::Number BoundedReader::ReadNearEnd(const std::uint8_t* begin, const std::uint8_t* at,
+                                                                   const std::uint8_t* end, std::uint64_t greatest) {
+  const auto offset = static_cast<std::size_t>(at - begin);
+  const auto remaining = static_cast<std::size_t>(end - at);
+  if (remaining == 0) FailAt(offset, "the bytes end where a number should begin");
+  const std::size_t bytes = VariableLengthBytes(*at);
+  if (bytes > remaining) FailAt(offset, "the bytes end inside a number");
   std::uint64_t value = 0;
-  DeserialiseVariableLengthUint64(m_at, value);
-  if (bytes > 1 && !IsShortest(value, bytes)) Fail("a number is not in its shortest form");
-  m_at += bytes;
-  return value;
+  DeserialiseVariableLengthUint64(at, value);
+  if (bytes > 1 && !IsShortest(value, bytes)) FailAt(offset, "a number is not in its shortest form");
+  if (value > greatest) FailAt(offset, "a number has more than 32 bits");
+  return {value, bytes};
 }
 
-std::uint32_t BoundedReader::ReadUint32Slowly() {
-  const std::uint8_t* const start = m_at;
-  const std::uint64_t value = ReadUint64Slowly();
-  if (value > std::numeric_limits<std::uint32_t>::max()) {
-    m_at = start;
-    Fail("a number has more than 32 bits");
-  }
-  return static_cast<std::uint32_t>(value);
+void BoundedReader::FailAt(std::size_t offset, std::string_view reason) { throw MalformedBytes(offset, std::string(reason)); }
+
+void BoundedReader::FailCount(std::size_t offset, std::uint32_t count) {
+  FailAt(offset, "the count " + std::to_string(count) + " is more than the bytes can hold");
 }
 
-void BoundedReader::FailCount(const std::uint8_t* start, std::uint32_t count) {
-  m_at = start;
-  Fail("the count " + std::to_string(count) + " is more than the bytes can hold");
-}
-
-void BoundedReader::ReadSchema(std::uint32_t currentSchema) {
-  const std::uint8_t* const start = m_at;
-  const std::uint32_t schema = ReadUint32();
-  if (schema == 0 || schema > currentSchema) {
-    m_at = start;
-    Fail("schema " + std::to_string(schema) + " is not one of 1 to " + std::to_string(currentSchema));
-  }
-}
-
-Guid BoundedReader::ReadGuid() {
-  if (remaining() < sizeof(Guid)) Fail("the bytes end inside a Guid");
-  Guid guid;
-  std::memcpy(&guid, m_at, sizeof(Guid));
-  m_at += sizeof(Guid);
-  return guid;
-}
-
-void BoundedReader::ReadFieldId(FieldId& field) {
-  field.oid = OID(ReadUint64());
-  for (Path::Element& element : field.path.Resize(ReadCount(1))) element = ReadUint32();
-}
-
-void BoundedReader::ExpectEnd() const {
-  if (remaining() != 0) Fail("the record should end here");
+void BoundedReader::FailSchema(std::size_t offset, std::uint32_t schema, std::uint32_t currentSchema) {
+  FailAt(offset, "schema " + std::to_string(schema) + " is not one of 1 to " + std::to_string(currentSchema));
 }
 
 }  // namespace vemo

@@ -28,8 +28,7 @@ void Read64(BoundedReader& reader) {
   reader.ReadUint64();
 }
 void ReadField(BoundedReader& reader) {
-  FieldId field;
-  reader.ReadFieldId(field);
+  reader.ReadField();
 }
 
 TEST(BoundedReader, ReadsNumbersOneAfterTheOther) {
@@ -118,15 +117,35 @@ TEST(BoundedReader, ReadsAGuidAndRefusesAShortOne) {
 }
 
 TEST(BoundedReader, ReadsAFieldAndRefusesAShortOne) {
-  const Bytes bytes = {0x01, 0x02, 0x00, 0x03};
+  const Bytes bytes = {0x81, 0x00, 0x02, 0x00, 0x03};
   BoundedReader reader(bytes);
-  FieldId field{OID(7), {1, 2, 3, 4}};
-  reader.ReadFieldId(field);
-  EXPECT_EQ(field, (FieldId{OID(1), {0, 3}}));
+  const FieldForm field = reader.ReadField();
+  EXPECT_EQ(field.object, 256u);
+  EXPECT_EQ(field.head, 0x0003000000000000u);
+  EXPECT_EQ(field.steps, bytes.data() + 3);
+  EXPECT_EQ(field.bytes, 2u);
   reader.ExpectEnd();
   ExpectRefusal({0x01}, ReadField, 1, "the bytes end where a number should begin");
   ExpectRefusal({0x01, 0x02, 0x00}, ReadField, 1, "the count 2 is more than the bytes can hold");
   ExpectRefusal({0x01, 0x02, 0x00, 0x80}, ReadField, 3, "the bytes end inside a number");
+}
+
+// Whether a word of steps can be read at once, or near the end they must be read one by one.
+TEST(BoundedReader, RefusesTheSameStepsWhateverFollows) {
+  for (const std::size_t following : {0u, 1u, 5u, 9u}) {
+    const auto followed = [&](Bytes bytes) {
+      bytes.insert(bytes.end(), following, 0);
+      return bytes;
+    };
+    ExpectRefusal(followed({0x01, 0x02, 0x05, 0x80, 0x7F}), ReadField, 3, "a number is not in its shortest form");
+    ExpectRefusal(followed({0x01, 0x02, 0x05, 0xF1, 0, 0, 0, 0}), ReadField, 3, "a number has more than 32 bits");
+    const Bytes sound = followed({0x01, 0x03, 0x05, 0x80, 0x80, 0x06});
+    BoundedReader reader(sound);
+    const FieldForm field = reader.ReadField();
+    EXPECT_EQ(field.head, 0x0580800600000000u);
+    EXPECT_EQ(field.bytes, 4u);
+    EXPECT_EQ(reader.offset(), 6u);
+  }
 }
 
 TEST(BoundedReader, RefusesBytesBehindTheRecord) {

@@ -8,7 +8,6 @@
 // No record tells the class of its children: that follows from the map's height.
 #pragma once
 
-#include <array>
 #include <cstddef>
 #include <memory>
 #include <string>
@@ -138,16 +137,16 @@ inline void CheckChild(BoundedReader& reader) {
 // Reads the keys of a node and sees that they ascend.
 class KeyOrderCheck {
  public:
-  void ReadNext(BoundedReader& reader) {
-    const FieldId& previous = m_keys[m_count % 2];
-    FieldId& key = m_keys[++m_count % 2];
-    reader.ReadFieldId(key);
-    if (m_count > 1 && CompareKeys(previous, key) >= 0) reader.Fail("the keys of a node do not ascend");
+  [[gnu::always_inline]] void ReadNext(BoundedReader& reader) {
+    const FieldForm key = reader.ReadField();
+    if (m_previous.steps != nullptr && !FieldForm::IsBefore(m_previous, key)) [[unlikely]] {
+      reader.Fail("the keys of a node do not ascend");
+    }
+    m_previous = key;
   }
 
  private:
-  std::array<FieldId, 2> m_keys;  // the last two, in turn
-  std::size_t m_count = 0;
+  FieldForm m_previous;  // without steps before the first
 };
 
 inline std::uint32_t CheckNodeCount(BoundedReader& reader, std::uint32_t least, ssize_t capacity) {
@@ -178,11 +177,13 @@ void CheckForm(BoundedReader& reader, const TFieldMapInternalNode<Traits>*) {
   reader.ReadSchema(Traits::kInternalNodeSchema);
   CheckChild(reader);
   const std::uint32_t n = CheckNodeCount(reader, 1, Traits::kCapacity);
+  BoundedReader entries = reader;  // the loop's own, which stays in registers
   KeyOrderCheck keys;
   for (std::uint32_t i = 0; i < n; ++i) {
-    keys.ReadNext(reader);
-    CheckChild(reader);
+    keys.ReadNext(entries);
+    CheckChild(entries);
   }
+  reader = entries;
 }
 
 template <class Traits>
@@ -192,11 +193,13 @@ void CheckForm(BoundedReader& reader, const TFieldMapLeafNode<Traits>*) {
   const std::uint64_t next = reader.ReadUint64();
   if (prev == next && prev != 0) reader.Fail("a leaf has the same neighbour on both sides");
   const std::uint32_t n = CheckNodeCount(reader, 0, Traits::kCapacity);
+  BoundedReader entries = reader;  // as for internal nodes
   KeyOrderCheck keys;
   for (std::uint32_t i = 0; i < n; ++i) {
-    keys.ReadNext(reader);
-    CheckForm(reader, static_cast<const typename Traits::Payload*>(nullptr));
+    keys.ReadNext(entries);
+    CheckForm(entries, static_cast<const typename Traits::Payload*>(nullptr));
   }
+  reader = entries;
 }
 
 // --- The forms that ToBytes, FromBytes and ToText look for ---
