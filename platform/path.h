@@ -51,8 +51,10 @@ class Path {
   // Makes the path `size` elements long, for the caller to fill in; what it held stays where the size allows.
   std::span<Element> Resize(std::uint32_t size) {
     if (IsOnHeap() || size > kInlineCapacity) return ResizeOnHeap(size);
-    // Over all of them: of a loop from `size` on, compilers make a call.
-    for (std::uint32_t i = 0; i < kInlineCapacity; ++i) m_inline[i] = i < size ? m_inline[i] : 0;
+    if (size < m_size) {
+      // Over all of them: of a loop from `size` on, compilers make a call.
+      for (std::uint32_t i = 0; i < kInlineCapacity; ++i) m_inline[i] = i < size ? m_inline[i] : 0;
+    }
     m_size = size;
     return {m_inline, size};
   }

@@ -14,6 +14,13 @@ std::uint8_t* SerialiseLongVariableLengthUint64(std::uint8_t* p, std::uint64_t v
   return p;
 }
 
+LongNumber DeserialiseLongVariableLengthUint32(const std::uint8_t* p) noexcept {
+  const std::uint32_t first = p[0];
+  if (first < 0xE0u) return {p + 3, (first & 0x1Fu) << 16 | std::uint32_t{p[1]} << 8 | p[2]};
+  if (first < 0xF0u) return {p + 4, (first & 0x0Fu) << 24 | std::uint32_t{p[1]} << 16 | std::uint32_t{p[2]} << 8 | p[3]};
+  return {p + 5, std::uint32_t{p[1]} << 24 | std::uint32_t{p[2]} << 16 | std::uint32_t{p[3]} << 8 | p[4]};
+}
+
 const std::uint8_t* DeserialiseLongVariableLengthUint64(const std::uint8_t* p, std::uint64_t& value) noexcept {
   if (*p == 0xFF) [[likely]] {  // most ids of 64 bits are drawn at random
     value = DeserialiseVariableLengthUint64FromNine(p, 9);

@@ -50,9 +50,17 @@ inline std::uint8_t* SerialiseVariableLengthUint32(std::uint8_t* p, std::uint32_
   return p;
 }
 
+// What a form of three bytes and more needs: returned together, so that the value of a short one never has to lie in memory.
+struct LongNumber {
+  const std::uint8_t* end;
+  std::uint32_t value;
+};
+LongNumber DeserialiseLongVariableLengthUint32(const std::uint8_t* p) noexcept;
+
 // Reads at `p` and returns the pointer after the value. Trusts its input: at least the bytes that the first one
-// announces must be readable.
-inline const std::uint8_t* DeserialiseVariableLengthUint32(const std::uint8_t* p, std::uint32_t& value) noexcept {
+// announces must be readable. Inlined always: reading a record is little else.
+[[gnu::always_inline]] inline const std::uint8_t* DeserialiseVariableLengthUint32(const std::uint8_t* p,
+                                                                                  std::uint32_t& value) noexcept {
   const std::uint32_t first = p[0];
   if (first < 0x80u) {
     value = first;
@@ -62,16 +70,9 @@ inline const std::uint8_t* DeserialiseVariableLengthUint32(const std::uint8_t* p
     value = (first & 0x3Fu) << 8 | p[1];
     return p + 2;
   }
-  if (first < 0xE0u) {
-    value = (first & 0x1Fu) << 16 | std::uint32_t{p[1]} << 8 | p[2];
-    return p + 3;
-  }
-  if (first < 0xF0u) {
-    value = (first & 0x0Fu) << 24 | std::uint32_t{p[1]} << 16 | std::uint32_t{p[2]} << 8 | p[3];
-    return p + 4;
-  }
-  value = std::uint32_t{p[1]} << 24 | std::uint32_t{p[2]} << 16 | std::uint32_t{p[3]} << 8 | p[4];
-  return p + 5;
+  const LongNumber number = DeserialiseLongVariableLengthUint32(p);
+  value = number.value;
+  return number.end;
 }
 
 // What a value above 32 bits, or a form of five bytes and more, needs.

@@ -39,14 +39,12 @@ std::byte* VectorOfByte::insertbytes(ssize_t position, ssize_t count) {
   return gap;
 }
 
-void VectorOfByte::GrowToAppend(ssize_t count) {
-  const ssize_t needed = size() + count;
-  const ssize_t grown = capacity() < needed ? needed + capacity() : capacity();
-  if (m_onHeap || needed > kInlineBytes) {
-    ReserveOnHeap(grown);
-  } else {
-    m_inlineCapacity = static_cast<std::uint8_t>(grown);
-  }
+std::byte* VectorOfByte::AppendOnHeap(ssize_t count) {
+  const ssize_t old = size();
+  const ssize_t needed = old + count;
+  ReserveOnHeap(capacity() < needed ? needed + capacity() : capacity());
+  m_heap.size = needed;
+  return m_heap.data + old;
 }
 
 void VectorOfByte::erasebytes(ssize_t position, ssize_t count) noexcept {

@@ -59,10 +59,11 @@ class VectorOfByte {
   // Appends `count` bytes and returns their start. A buffer that is too small grows to the needed size plus its old
   // capacity, so that appending costs amortised constant time.
   std::byte* appendbytes(ssize_t count) {
-    const ssize_t old = size();
-    if (old + count > (m_onHeap ? m_heap.capacity : kInlineBytes) || old + count > capacity()) GrowToAppend(count);
-    SetSize(old + count);
-    return data() + old;
+    if (m_onHeap || m_inlineSize + count > kInlineBytes) return AppendOnHeap(count);
+    std::byte* const appended = m_inline + m_inlineSize;
+    m_inlineSize = static_cast<std::uint8_t>(m_inlineSize + count);
+    if (m_inlineCapacity < m_inlineSize) m_inlineCapacity = static_cast<std::uint8_t>(m_inlineCapacity + m_inlineSize);
+    return appended;
   }
 
   // Removes the bytes [position, position + count).
@@ -87,7 +88,7 @@ class VectorOfByte {
   }
   void AssignSlowly(const VectorOfByte& other);
   void ReserveOnHeap(ssize_t capacity);
-  void GrowToAppend(ssize_t count);
+  std::byte* AppendOnHeap(ssize_t count);
   void FreeHeap() noexcept;
   void MoveToHeap(ssize_t capacity);
 

@@ -72,7 +72,7 @@ class TPtoQMap {
   // The byte form: the number of runs, then for each its distance from the end of the run before it (the
   // first: from 0) and its length.
   void Serialise(Archive& ar) const;
-  void Deserialise(InputArchive& ar);
+  [[gnu::always_inline]] void Deserialise(InputArchive& ar);
   // The text form: a dot for every live position up to the last run and a star for every tombstone, in
   // brackets; then the runs. The runs [1,3) and [5,6) are "[.**..*]{[1,3)[5,6)}".
   void Write(xostream& os) const;
@@ -219,12 +219,11 @@ void TPtoQMap<T>::Serialise(Archive& ar) const {
 }
 
 template <class T>
-void TPtoQMap<T>::Deserialise(InputArchive& ar) {
+inline void TPtoQMap<T>::Deserialise(InputArchive& ar) {
   ssize_t n = 0;
   const std::uint8_t* p = DeserialiseVariableLengthInteger(ar.ptr(), n);
   VEMO_ASSERT(0 <= n);
   m_tombstones.clear();
-  m_tombstones.ReserveMore(n);
   Interval* const runs = m_tombstones.AppendRaw(n);
   T position = 0;
   for (ssize_t i = 0; i < n; ++i) {
@@ -262,7 +261,7 @@ void Serialise(Archive& ar, const TPtoQMap<T>& map) {
 }
 
 template <class T>
-void Deserialise(InputArchive& ar, TPtoQMap<T>& map) {
+[[gnu::always_inline]] inline void Deserialise(InputArchive& ar, TPtoQMap<T>& map) {
   map.Deserialise(ar);
 }
 

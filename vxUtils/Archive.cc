@@ -42,12 +42,4 @@ void Serialise(Archive& ar, const FieldId& field) {
   for (const Path::Element element : field.path.elements()) SerialiseVariableLengthUint(ar, ssize_t{element});
 }
 
-void Deserialise(InputArchive& ar, FieldId& field) {
-  const std::uint8_t* p = DeserialiseVariableLengthUint64(ar.ptr(), field.oid.m_value);
-  std::uint32_t size = 0;
-  p = DeserialiseVariableLengthUint32(p, size);
-  for (Path::Element& element : field.path.Resize(size)) p = DeserialiseVariableLengthUint32(p, element);
-  ar.SetPtr(p);
-}
-
 }  // namespace vemo

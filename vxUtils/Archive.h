@@ -85,6 +85,9 @@ class Archive {
 
 // A cursor over bytes in memory, which it does not own. It carries no end: readers trust their input, so bytes from
 // outside pass a BoundedReader first.
+//
+// A cursor may be copied. What reads keys and the most common payload is inlined always: the copy that a loop keeps to itself
+// then stays in a register.
 class InputArchive {
  public:
   explicit InputArchive(const std::uint8_t* p) noexcept : p_(p) {}
@@ -164,7 +167,13 @@ inline void Deserialise(InputArchive& ar, OID& oid) noexcept {
   ar.SetPtr(DeserialiseVariableLengthUint64(ar.ptr(), oid.m_value));
 }
 void Serialise(Archive& ar, const FieldId& field);
-void Deserialise(InputArchive& ar, FieldId& field);
+[[gnu::always_inline]] inline void Deserialise(InputArchive& ar, FieldId& field) {
+  const std::uint8_t* p = DeserialiseVariableLengthUint64(ar.ptr(), field.oid.m_value);
+  std::uint32_t size = 0;
+  p = DeserialiseVariableLengthUint32(p, size);
+  for (Path::Element& element : field.path.Resize(size)) p = DeserialiseVariableLengthUint32(p, element);
+  ar.SetPtr(p);
+}
 
 template <class T>
 Archive& operator<<(Archive& ar, const T& value) {
@@ -173,7 +182,7 @@ Archive& operator<<(Archive& ar, const T& value) {
 }
 
 template <class T>
-InputArchive& operator>>(InputArchive& ar, T& value) {
+[[gnu::always_inline]] inline InputArchive& operator>>(InputArchive& ar, T& value) {
   Deserialise(ar, value);
   return ar;
 }

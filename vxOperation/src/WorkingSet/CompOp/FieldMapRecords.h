@@ -113,13 +113,15 @@ void TFieldMapLeafNode<Traits>::Deserialise(InputArchive& ar) {
   VEMO_ASSERT_TEXT(0 <= n && n <= Traits::kCapacity, "0 <= n && n <= 100");
   DestructArrayElements(m_entrys.Slot(0), std::exchange(m_numKeyEntrys, 0));
   // An entry is counted before it is read, so that the node owns it whatever happens.
-  while (m_numKeyEntrys < n) {
-    auto* raw = reinterpret_cast<std::byte*>(m_entrys.Slot(m_numKeyEntrys));
+  InputArchive entries = ar;  // the loop's own, which stays in a register
+  for (ssize_t i = 0; i < n; ++i) {
+    auto* raw = reinterpret_cast<std::byte*>(m_entrys.Slot(i));
     auto* key = ::new (raw) FieldId;  // apart from its payload: the key of an entry is constant
     auto* payload = ::new (raw + Traits::Map::GetPayloadOffset()) typename Traits::Payload;
-    ++m_numKeyEntrys;
-    ar >> *key >> *payload;
+    m_numKeyEntrys = i + 1;
+    entries >> *key >> *payload;
   }
+  ar = entries;
 }
 
 template <class Traits>
