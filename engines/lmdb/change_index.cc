@@ -35,6 +35,7 @@ void ChangeIndex::DropUnneeded(Versions& versions) const noexcept {
 void ChangeIndex::Add(std::uint64_t commit, const ChangeBlob& blob, std::size_t bytes) {
   const std::unique_lock lock(m_mutex);
   if (commit <= m_newest || commit < m_droppedBefore) return;
+  if (m_versions.empty()) m_versions.reserve(blob.changes.size());
   for (const ChangeBlob::Change& change : blob.changes) {
     const Version version{commit, change.offset, change.length, change.check};
     const auto [entry, isNew] = m_versions.try_emplace(change.oid, Versions{version, {}});
@@ -42,9 +43,9 @@ void ChangeIndex::Add(std::uint64_t commit, const ChangeBlob& blob, std::size_t 
     // A call that ran out of memory half-way is made again.
     if (isNew || versions.newest.commit == commit) continue;
     if (versions.newest.commit < m_droppedBefore) --m_retained;
-    versions.older.push_back(versions.newest);
+    if (IsNeeded(versions.newest, commit)) versions.older.push_back(versions.newest);
     versions.newest = version;
-    DropUnneeded(versions);
+    if (!versions.older.empty()) DropUnneeded(versions);
   }
   m_blobs.push_back({commit, bytes});
   m_bytes += bytes;
