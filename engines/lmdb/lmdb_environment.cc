@@ -107,7 +107,10 @@ LmdbEnvironment::LmdbEnvironment(const LmdbOptions& options)
   }
   m_claim.emplace(m_path, m_name);
   if (contents == FolderContents::kNothingYet) MakeEmptyData(m_path, m_name);
-  if (contents == FolderContents::kData) ProbeData();
+  if (contents == FolderContents::kData) {
+    LogFile::WillNeed(m_path);
+    ProbeData();
+  }
   OpenFlexibly();
   if (!options.create) return;
   try {

@@ -20,6 +20,13 @@ LogFile::~LogFile() {
   if (IsOpen()) ::close(m_file);
 }
 
+void LogFile::WillNeed(const std::filesystem::path& folder) noexcept {
+  const int file = ::open((folder / kLogFile).c_str(), O_RDONLY | O_CLOEXEC | O_NONBLOCK);
+  if (file < 0) return;
+  ::posix_fadvise(file, 0, kLogBytes, POSIX_FADV_WILLNEED);
+  ::close(file);
+}
+
 void LogFile::Replace(int file) noexcept {
   if (m_file >= 0) ::close(m_file);
   m_file = file;

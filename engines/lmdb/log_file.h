@@ -22,6 +22,9 @@ class LogFile {
   LogFile(const LogFile&) = delete;
   LogFile& operator=(const LogFile&) = delete;
 
+  // The log of a space that is about to be opened: the system is asked to read it from the disk meanwhile.
+  static void WillNeed(const std::filesystem::path& folder) noexcept;
+
   // Opens the file that has the name now, where it is there: another process may have made it anew since. Throws
   // StoreError.
   void Open();

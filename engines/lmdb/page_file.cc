@@ -44,6 +44,10 @@ bool PageFile::Map(std::uint64_t bytes) {
   return true;
 }
 
+void PageFile::AskFor(std::uint64_t offset, std::uint64_t bytes) noexcept {
+  ::posix_fadvise(m_file, static_cast<off_t>(offset), static_cast<off_t>(bytes), POSIX_FADV_WILLNEED);
+}
+
 void PageFile::ReadAhead() noexcept {
   const std::lock_guard lock(m_mapping);
   m_readsAhead = true;

@@ -36,6 +36,11 @@ class PageFile {
     if (m_reached.load(std::memory_order_relaxed) < kFewPages && m_reached.fetch_add(1) + 1 == kFewPages) ReadAhead();
   }
 
+  // These bytes will be read soon: while the file is new to this process, the system is asked to read them from the disk meanwhile.
+  void WillNeed(std::uint64_t offset, std::uint64_t bytes) noexcept {
+    if (m_asked.load(std::memory_order_relaxed) < kMostAsked && m_asked.fetch_add(1) < kMostAsked) AskFor(offset, bytes);
+  }
+
   // Asks the system anew how long the file is: one that was cut off meanwhile must not be touched there. Returns it.
   std::uint64_t Measure();
 
@@ -46,7 +51,10 @@ class PageFile {
  private:
   // Opening a space reaches some tens of pages, and one at least for each commit that has left changes which wait.
   static constexpr int kFewPages = 256;
+  // Opening asks for the roots of the tables, the list of free pages and the changes that wait.
+  static constexpr int kMostAsked = 64;
 
+  void AskFor(std::uint64_t offset, std::uint64_t bytes) noexcept;
   void ReadAhead() noexcept;
   const std::uint8_t* AtAfterLooking(std::uint64_t offset, std::uint64_t bytes);
   std::uint64_t FileBytes() const;
@@ -57,7 +65,7 @@ class PageFile {
   int m_file = -1;
   const std::string m_space;
   std::uint64_t m_room;
-  std::atomic<int> m_reached{0};
+  std::atomic<int> m_reached{0}, m_asked{0};
   std::mutex m_mapping;                               // guards what follows, of the last two the changes
   bool m_readsAhead = false;
   std::vector<std::pair<void*, std::size_t>> m_maps;  // readers may still be in those before the last

@@ -3,6 +3,7 @@
 #define XXH_INLINE_ALL
 #include <xxhash.h>
 
+#include <algorithm>
 #include <utility>
 
 #include "engines/lmdb/big_endian.h"
@@ -11,6 +12,9 @@
 
 namespace vemo {
 namespace {
+
+// Of the changes of a commit, which may be long, what tells whose they are stands first.
+constexpr std::uint64_t kMostAhead = std::uint64_t{128} << 10;
 
 // Null for a key that is no id.
 OID IdOf(std::string_view key) noexcept {
@@ -75,6 +79,7 @@ ByteView PageReader::Run(PageNumber first, std::size_t bytes, const PageTable& t
   const std::uint64_t pages = RunPages(bytes, m_pageBytes);
   if (const char* fault = FaultOfPlace(first, pages)) Fail(first, table, fault, lost);
   m_file->CountReached();
+  if (pages > 1) m_file->WillNeed(first * m_pageBytes, std::min<std::uint64_t>(pages * m_pageBytes, kMostAhead));
   const std::uint8_t* run = m_file->At(first * m_pageBytes, kPageHeaderBytes + bytes);
   if (run == nullptr) Fail(first, table, "the file ends before it", lost);
   const bool mayBeLonger = table.order == KeyOrder::kNumbers;

@@ -53,6 +53,11 @@ void CheckMeta(PageFile& file, const MetaPage& meta, const std::string& space) {
   }
 }
 
+// Pages that are read one after the other are asked for together.
+void WillNeedRoot(PageFile& file, const SpaceState& state, const PageTable& table) noexcept {
+  if (table.root.root != kNoPage) file.WillNeed(table.root.root * state.pageBytes, state.pageBytes);
+}
+
 void ReadMain(const std::shared_ptr<PageFile>& file, SpaceState& state, const std::string& space) {
   Digest digest;
   digest.Add(&state.meta, sizeof state.meta);
@@ -78,6 +83,7 @@ void ReadMain(const std::shared_ptr<PageFile>& file, SpaceState& state, const st
     state.tables.push_back(std::move(table));
   }
   state.rootsDigest = digest.Value();
+  for (const PageTable& table : state.tables) WillNeedRoot(*file, state, table);
 }
 
 void AddList(TreeCursor& cursor, PageNumber lastPage, PageSet& free) {
@@ -204,6 +210,8 @@ std::shared_ptr<const SpaceState> ReadState(const std::shared_ptr<PageFile>& fil
   state->main.root = meta.main;
   state->main.number = kMainNumber;
   state->main.isMain = true;
+  WillNeedRoot(*file, *state, state->main);
+  WillNeedRoot(*file, *state, state->freeTable);
   try {
     ReadFreePages(file, *state, space);
   } catch (const DamagedStorage& damaged) {
