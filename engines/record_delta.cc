@@ -195,8 +195,8 @@ std::optional<Bytes> RecordDelta(ByteView old, ByteView next, std::size_t mostBy
   return delta.Take();
 }
 
-Bytes ApplyRecordDelta(ByteView old, ByteView delta) {
-  Bytes next;
+void ApplyRecordDelta(ByteView old, ByteView delta, Bytes& next) {
+  next.clear();
   next.reserve(old.size() + delta.size());
   BoundedReader reader(delta);
   const auto take = [&](ByteView& from, std::uint64_t count) {
@@ -217,7 +217,6 @@ Bytes ApplyRecordDelta(ByteView old, ByteView delta) {
     reader.Skip(added);
   }
   append(old);
-  return next;
 }
 
 }  // namespace vemo

@@ -20,8 +20,8 @@ namespace vemo {
 // search of bounded width where they part; not always the shortest. Throws std::bad_alloc alone.
 std::optional<Bytes> RecordDelta(ByteView old, ByteView next, std::size_t mostBytes);
 
-// The version to which `delta` leads from `old`. Throws MalformedBytes when the two do not fit together. What it allocates is
-// bounded by the sizes of both.
-Bytes ApplyRecordDelta(ByteView old, ByteView delta);
+// Makes of `next` the version to which `delta` leads from `old`, in the room that it has as far as it has some. Throws MalformedBytes
+// when the two do not fit together, and what `next` is then is not told. What it allocates is bounded by the sizes of both.
+void ApplyRecordDelta(ByteView old, ByteView delta, Bytes& next);
 
 }  // namespace vemo

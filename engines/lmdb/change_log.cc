@@ -148,7 +148,7 @@ ByteView ReadRecord(OID oid, const TreeCursor& cursor, const ChangeIndex& index,
   const ByteView delta = blob.subspan(version->offset, version->length);
   if (DeltaCheck(oid, version->commit, delta) != version->check) cursor.Fail(kDamaged);
   try {
-    changed = ApplyRecordDelta(stored.record, delta);
+    ApplyRecordDelta(stored.record, delta, changed);
   } catch (const MalformedBytes& malformed) {
     cursor.Fail((std::string("the changes of a record there do not fit it: ") + malformed.what()).c_str());
   }

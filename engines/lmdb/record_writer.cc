@@ -145,8 +145,7 @@ void RecordWriter::SettleRecord(OID oid) {
   const std::optional<StoredRecord> stored = m_writer.StoredToPut(oid);
   const std::optional<ChangeIndex::Version> version = m_index.Find(oid, m_commit - 1);
   if (!stored || !version || version->commit <= stored->commit) return;
-  Bytes changed;
-  m_writer.PutRecord(oid, m_commit, m_writer.CurrentToPut(oid, m_index, changed));
+  m_writer.PutRecord(oid, m_commit, m_writer.CurrentToPut(oid, m_index, m_changed));
 }
 
 void RecordWriter::DropBlobs() {
