@@ -41,23 +41,23 @@ const ReflectedInterface& _GetReflected(const IPersistable*) {
 namespace {
 
 template <class T>
-ClassEntry MakeEntry(bool isMap) {
+ClassEntry MakeEntry(bool isMap, std::size_t index) {
   return {GetReflectedClass<T>(), IPersistable::Stubs<T>::GetTable(),
           [](BoundedReader& reader) { CheckForm(reader, static_cast<const T*>(nullptr)); },
-          [](const void* object) { return MemoryBytesOf(static_cast<const T*>(object)); }, isMap};
+          [](const void* object) { return MemoryBytesOf(static_cast<const T*>(object)); }, isMap, index};
 }
 
-const std::array<ClassEntry, 9>& Entries() {
-  static const std::array<ClassEntry, 9> entries = {
-      MakeEntry<FieldIdToVectorInsertionsMap>(true),
-      MakeEntry<FieldIdToVectorInsertionsMapInternalNode>(false),
-      MakeEntry<FieldIdToVectorInsertionsMapLeafNode>(false),
-      MakeEntry<FieldIdToVectorTombstonesMap>(true),
-      MakeEntry<FieldIdToVectorTombstonesMapInternalNode>(false),
-      MakeEntry<FieldIdToVectorTombstonesMapLeafNode>(false),
-      MakeEntry<FieldIdToVectorInsertionsAndDeletionsMap>(true),
-      MakeEntry<FieldIdToVectorInsertionsAndDeletionsMapInternalNode>(false),
-      MakeEntry<FieldIdToVectorInsertionsAndDeletionsMapLeafNode>(false),
+const std::array<ClassEntry, kNumClasses>& Entries() {
+  static const std::array<ClassEntry, kNumClasses> entries = {
+      MakeEntry<FieldIdToVectorInsertionsMap>(true, 0),
+      MakeEntry<FieldIdToVectorInsertionsMapInternalNode>(false, 1),
+      MakeEntry<FieldIdToVectorInsertionsMapLeafNode>(false, 2),
+      MakeEntry<FieldIdToVectorTombstonesMap>(true, 3),
+      MakeEntry<FieldIdToVectorTombstonesMapInternalNode>(false, 4),
+      MakeEntry<FieldIdToVectorTombstonesMapLeafNode>(false, 5),
+      MakeEntry<FieldIdToVectorInsertionsAndDeletionsMap>(true, 6),
+      MakeEntry<FieldIdToVectorInsertionsAndDeletionsMapInternalNode>(false, 7),
+      MakeEntry<FieldIdToVectorInsertionsAndDeletionsMapLeafNode>(false, 8),
   };
   return entries;
 }

@@ -9,12 +9,15 @@
 
 namespace vemo {
 
+inline constexpr std::size_t kNumClasses = 9;
+
 struct ClassEntry {
   const ReflectedClass* reflected;
   const IPersistable::FnTable* table;
   void (*checkForm)(BoundedReader& reader);  // throws MalformedBytes on a body that Deserialise must not see
   std::size_t (*memoryBytes)(const void* object);  // what it takes in memory, its heap included
   bool isMap;
+  std::size_t index;  // below kNumClasses
 
   std::string_view Name() const noexcept { return reflected->m_name; }
 };

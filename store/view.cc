@@ -119,12 +119,14 @@ void View::Unbind(const IdSet& ids) const {
 
 bool View::Trim(std::size_t allowance) {
   if (m_residents.EvictableBytes() <= allowance) return false;
+  constexpr std::size_t kPartKept = 10;  // what a choice leaves free
+  m_blocks.Clear();
   const Residents::Choice choice = m_residents.Choose(allowance);
   Unbind(choice.unbound);
   for (const OID oid : choice.leaving) {
     const ptr<IPersistable> object = Find(oid);
     Release(oid);
-    DestroyObject(object);
+    m_blocks.End(object, allowance / kPartKept);
   }
   CacheCounters::Add(m_counters.evictions, choice.leaving.size());
   CacheCounters::Add(m_counters.passes, 1);
@@ -214,7 +216,7 @@ ptr<IPersistable> View::Decode(OID oid, ByteView record, const IPersistable::FnT
     BoundedReader reader(envelope.body);
     classEntry.checkForm(reader);
     reader.ExpectEnd();
-    object = ptr<IPersistable>(classEntry.reflected->m_createFn().m_self, classEntry.table);
+    object = m_blocks.Create(classEntry);
     ReadBody(object, envelope.body);
     return object;
   } catch (const MalformedBytes& malformed) {
@@ -256,6 +258,7 @@ void View::ForgetResidents() noexcept {
     forgotten = m_residents.TakeAll();
   }
   for (const auto& [oid, resident] : forgotten) DestroyObject(resident.object);
+  m_blocks.Clear();
   m_roots.Forget();
 }
 

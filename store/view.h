@@ -32,6 +32,7 @@
 #include "store/class_registry.h"
 #include "store/engine.h"
 #include "store/object_state.h"
+#include "store/node_blocks.h"
 #include "store/residents.h"
 #include "store/root_maps.h"
 #include "store/use_check.h"
@@ -138,6 +139,7 @@ class View {
   ClassNumbers m_classes;
   mutable std::mutex m_residentsMutex;  // held where the residents change, for Holds
   Residents m_residents;
+  NodeBlocks m_blocks;  // of residents that were ended for the sake of memory
   UseCheck m_use;
   CacheCounters& m_counters;
   RootMaps m_roots;
