@@ -172,8 +172,7 @@ void LmdbEnvironment::ProbeData() const {
   const MetaPage other = ReadMetaPage(*file, 1, pageBytes);
   if (other.transaction > newest.transaction) newest = other;
   const auto state = ReadState(file, newest, m_name);
-  const auto reader = MakeReader(file, *state, m_name);
-  if (!HoldsSpace(*reader, *state) && !m_options.create) ThrowUnfinished(m_name);
+  if (!HoldsSpace(file, *state, m_name) && !m_options.create) ThrowUnfinished(m_name);
 }
 
 void LmdbEnvironment::Open(std::size_t mapBytes) {

@@ -74,8 +74,7 @@ std::uint64_t ReadNumber(PageReader& reader, const SpaceState& state, std::strin
   throw IncompatibleSpace("cannot open " + space + ": it is an LMDB environment of another program, not a space");
 }
 
-void CheckLayout(PageReader& reader, const PageTable& system) {
-  const std::string& space = reader.space();
+void CheckLayout(PageReader& reader, const PageTable& system, const std::string& space) {
   TreeCursor cursor(reader, system);
   if (!cursor.Find(kLayoutKey)) ThrowForeign(space);
   const std::string_view value = TextOf(cursor.StoredValue());
@@ -95,13 +94,13 @@ void CheckLayout(PageReader& reader, const PageTable& system) {
 
 }  // namespace
 
-bool HoldsSpace(PageReader& reader, const SpaceState& state) {
-  const std::string& space = reader.space();
+bool HoldsSpace(const std::shared_ptr<PageFile>& file, const SpaceState& state, const std::string& space) {
   if (state.main.root.flags != 0) ThrowForeign(space);
   if (state.tables.empty() && !state.hasOtherEntries) return false;
   const PageTable* system = state.Table(kSystemTable);
   if (system == nullptr || system->root.flags != 0) ThrowForeign(space);
-  CheckLayout(reader, *system);
+  PageReader reader = MakeReader(file, state, space);
+  CheckLayout(reader, *system, space);
   for (const TableName& name : kTables) {
     const PageTable* table = state.Table(name.name);
     if (table == nullptr || table->root.flags != 0) {

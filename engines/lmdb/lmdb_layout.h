@@ -55,9 +55,9 @@ inline constexpr std::string_view kSystemTable = "system";
 inline constexpr std::size_t kCommitBytes = 2 * sizeof(std::uint64_t);
 std::uint64_t CommitStamp(std::uint64_t tag, std::uint64_t commit) noexcept;
 
-// Whether `state`, whose pages `reader` reads, holds a space: false when there is no table at all. Throws IncompatibleSpace
-// for anything else than a space of this layout, DamagedStorage for a damaged one.
-bool HoldsSpace(PageReader& reader, const SpaceState& state);
+// Whether `state` holds a space: false when there is no table at all. Throws IncompatibleSpace for anything else than a
+// space of this layout, DamagedStorage for a damaged one. `space` is the name for messages.
+bool HoldsSpace(const std::shared_ptr<PageFile>& file, const SpaceState& state, const std::string& space);
 
 // The handles of the tables, which are there.
 LmdbTables OpenTables(MDB_txn* txn, const std::string& space);

@@ -27,7 +27,7 @@ OID ToOid(const TreeCursor& cursor) {
 LmdbSnapshot::LmdbSnapshot(std::shared_ptr<LmdbEnvironment> environment)
     : m_environment(std::move(environment)),
       m_reading(*m_environment),
-      m_reader(*State().data->reader),
+      m_reader(MakeReader(State().data->file, *State().data->state, m_environment->name())),
       m_records(m_reader, Table(kRecordsTable)),
       m_changes(m_environment->changes(), m_reader, State()) {}
 

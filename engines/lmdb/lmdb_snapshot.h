@@ -82,7 +82,7 @@ class LmdbSnapshot final : public EngineSnapshot {
 
   std::shared_ptr<LmdbEnvironment> m_environment;
   OpenReading m_reading;
-  PageReader& m_reader;  // of the state
+  mutable PageReader m_reader;  // remembers the pages that it has checked
   mutable TreeCursor m_records;
   mutable Bytes m_changed;  // the record that Read has put together last
   const SnapshotChanges m_changes;

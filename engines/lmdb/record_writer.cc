@@ -142,10 +142,10 @@ void RecordWriter::Settle(const std::vector<OID>& touched, const ChangeIndex::Lo
 
 // Nothing to do for a record that was removed, or written whole meanwhile.
 void RecordWriter::SettleRecord(OID oid) {
-  const std::optional<StoredRecord> stored = m_writer.StoredToPut(oid);
+  const std::optional<StoredRecord> stored = m_writer.Stored(oid);
   const std::optional<ChangeIndex::Version> version = m_index.Find(oid, m_commit - 1);
   if (!stored || !version || version->commit <= stored->commit) return;
-  m_writer.PutRecord(oid, m_commit, m_writer.CurrentToPut(oid, m_index, m_changed));
+  m_writer.PutRecord(oid, m_commit, m_writer.CurrentRecord(oid, m_index, m_changed));
 }
 
 void RecordWriter::DropBlobs() {

@@ -40,9 +40,8 @@ void SealedSpace::ThrowLostCommit(std::uint64_t transaction) const {
 }
 
 KnownStatePtr SealedSpace::Remember(KnownStatePtr state) {
-  KnownStatePtr before;  // ends without the lock: it may have much to free
   const std::lock_guard lock(m_mutex);
-  before = std::exchange(m_known, state);
+  m_known = state;
   return state;
 }
 
@@ -50,8 +49,10 @@ KnownStatePtr SealedSpace::Read(const MetaPage& meta) const {
   auto known = std::make_shared<KnownState>();
   known->file = m_file;
   known->state = ReadState(m_file, meta, m_space);
-  known->reader = MakeReader(m_file, *known->state, m_space);
-  if (HoldsSpace(*known->reader, *known->state)) known->numbers = ReadNumbers(*known->reader, *known->state);
+  if (HoldsSpace(m_file, *known->state, m_space)) {
+    PageReader reader = MakeReader(m_file, *known->state, m_space);
+    known->numbers = ReadNumbers(reader, *known->state);
+  }
   if (const PageTable* records = known->state->Table(kRecordsTable)) known->records = records->root.entries;
   if (known->state->free == nullptr) known->doubt = known->state->freeFault;
   return known;
@@ -156,10 +157,10 @@ std::string SealedSpace::FaultOfOtherMeta(const SpaceState& state) const {
   try {
     const auto before = ReadState(m_file, other, m_space);
     if (state.Table(kSystemTable) == nullptr || before->Table(kSystemTable) == nullptr) return {};
-    const auto reader = MakeReader(m_file, state, m_space);
-    const auto readerBefore = MakeReader(m_file, *before, m_space);
-    if (ReadNumbers(*readerBefore, *before).generation > ReadNumbers(*reader, state).generation ||
-        ReadNextId(*readerBefore, *before) > ReadNextId(*reader, state)) {
+    PageReader reader = MakeReader(m_file, state, m_space);
+    PageReader readerBefore = MakeReader(m_file, *before, m_space);
+    if (ReadNumbers(readerBefore, *before).generation > ReadNumbers(reader, state).generation ||
+        ReadNextId(readerBefore, *before) > ReadNextId(reader, state)) {
       return "a newer commit is hidden";
     }
   } catch (const DamagedStorage&) {

@@ -30,7 +30,6 @@ namespace vemo {
 struct KnownState {
   std::shared_ptr<PageFile> file;
   std::shared_ptr<const SpaceState> state;
-  std::shared_ptr<PageReader> reader;  // for all who read the commit, so that each page is checked once
   std::string doubt;          // why nothing may be written; empty where all is well
   std::uint64_t records = 0;  // in the commit
   SpaceNumbers numbers;       // all 0 where there is no space yet

@@ -61,8 +61,8 @@ void WillNeedRoot(PageFile& file, const SpaceState& state, const PageTable& tabl
 void ReadMain(const std::shared_ptr<PageFile>& file, SpaceState& state, const std::string& space) {
   Digest digest;
   digest.Add(&state.meta, sizeof state.meta);
-  const auto reader = MakeReader(file, state, space);
-  TreeCursor cursor(*reader, state.main);
+  PageReader reader = MakeReader(file, state, space);
+  TreeCursor cursor(reader, state.main);
   unsigned number = kFirstTableNumber;
   for (bool found = cursor.First(); found; found = cursor.Next()) {
     const std::string_view name = cursor.Key();
@@ -221,9 +221,8 @@ std::shared_ptr<const SpaceState> ReadState(const std::shared_ptr<PageFile>& fil
   return state;
 }
 
-std::unique_ptr<PageReader> MakeReader(const std::shared_ptr<PageFile>& file, const SpaceState& state,
-                                       const std::string& space) {
-  return std::make_unique<PageReader>(file, state.pageBytes, state.meta.lastPage, state.free, space);
+PageReader MakeReader(const std::shared_ptr<PageFile>& file, const SpaceState& state, const std::string& space) {
+  return PageReader(file, state.pageBytes, state.meta.lastPage, state.free, space);
 }
 
 }  // namespace vemo

@@ -48,7 +48,7 @@ std::size_t PageBytesOf(PageFile& file);
 std::shared_ptr<const SpaceState> ReadState(const std::shared_ptr<PageFile>& file, const MetaPage& meta,
                                             const std::string& space);
 
-// A reader of the commit's pages that has checked none yet.
-std::unique_ptr<PageReader> MakeReader(const std::shared_ptr<PageFile>& file, const SpaceState& state, const std::string& space);
+// A reader of the commit's pages.
+PageReader MakeReader(const std::shared_ptr<PageFile>& file, const SpaceState& state, const std::string& space);
 
 }  // namespace vemo

@@ -40,23 +40,18 @@ SpaceWriter::SpaceWriter(std::function<MDB_txn*()> begin, const LmdbTables& tabl
       m_state(state),
       m_log(log),
       m_space(space),
-      m_records{tables.records, kRecordsTable},
-      m_changes{tables.changes, kChangesTable},
-      m_info{tables.info, TableNameOf(NamedTable::kInfo)},
-      m_roots{tables.roots, TableNameOf(NamedTable::kRoots)},
-      m_meta{tables.meta, TableNameOf(NamedTable::kMeta)},
-      m_deletions{tables.deletions, kDeletionsTable},
-      m_system{tables.system, kSystemTable} {}
+      m_reader(MakeReader(state.data->file, *state.data->state, space)),
+      m_records(MakeTable(tables.records, kRecordsTable)),
+      m_changes(MakeTable(tables.changes, kChangesTable)),
+      m_info(MakeTable(tables.info, TableNameOf(NamedTable::kInfo))),
+      m_roots(MakeTable(tables.roots, TableNameOf(NamedTable::kRoots))),
+      m_meta(MakeTable(tables.meta, TableNameOf(NamedTable::kMeta))),
+      m_deletions(MakeTable(tables.deletions, kDeletionsTable)),
+      m_system(MakeTable(tables.system, kSystemTable)) {}
 
-const PageTable& SpaceWriter::PagesOf(std::string_view table) const {
-  return *m_state.data->state->Table(table);  // a space has all of them: HoldsSpace
-}
-
-TreeCursor& SpaceWriter::CursorFor(Table& table) {
-  if (table.cursor) return *table.cursor;
-  if (m_ownReader == nullptr) m_ownReader = MakeReader(m_state.data->file, *m_state.data->state, m_space);
-  table.pages = &PagesOf(table.name);
-  return table.cursor.emplace(*m_ownReader, *table.pages);
+SpaceWriter::Table SpaceWriter::MakeTable(unsigned handle, std::string_view name) {
+  const PageTable& table = *m_state.data->state->Table(name);  // a space has all of them: HoldsSpace
+  return {handle, table, TreeCursor(m_reader, table)};
 }
 
 SpaceWriter::Table& SpaceWriter::Named(NamedTable table) noexcept {
@@ -73,32 +68,23 @@ SpaceWriter::Table& SpaceWriter::Named(NamedTable table) noexcept {
 
 // Whether the key is there. Its overflow run is freed with it, and so must be its own.
 bool SpaceWriter::Check(Table& table, std::string_view key) {
-  TreeCursor& cursor = CursorFor(table);
-  if (!cursor.Find(key)) return false;
-  if (table.pages->isTagged) {
-    cursor.Value();
+  if (!table.cursor.Find(key)) return false;
+  if (table.pages.isTagged) {
+    table.cursor.Value();
   } else {
-    cursor.StoredValue();
+    table.cursor.StoredValue();
   }
   return true;
 }
 
-std::optional<StoredRecord> SpaceWriter::StoredAt(TreeCursor& cursor, OID oid) {
-  if (!cursor.Find(IdKey(oid).text())) return std::nullopt;
-  return ReadStoredRecord(cursor);
-}
-
 std::optional<StoredRecord> SpaceWriter::Stored(OID oid) {
-  if (!m_lookups) m_lookups.emplace(reader(), PagesOf(kRecordsTable));
-  return StoredAt(*m_lookups, oid);
+  if (!m_records.cursor.Find(IdKey(oid).text())) return std::nullopt;
+  return ReadStoredRecord(m_records.cursor);
 }
 
-std::optional<StoredRecord> SpaceWriter::StoredToPut(OID oid) { return StoredAt(CursorFor(m_records), oid); }
-
-ByteView SpaceWriter::CurrentToPut(OID oid, const ChangeIndex& index, Bytes& changed) {
-  TreeCursor& cursor = CursorFor(m_records);
-  cursor.Find(IdKey(oid).text());
-  return ReadRecord(oid, cursor, index, reader(), m_state, changed);
+ByteView SpaceWriter::CurrentRecord(OID oid, const ChangeIndex& index, Bytes& changed) {
+  m_records.cursor.Find(IdKey(oid).text());
+  return ReadRecord(oid, m_records.cursor, index, m_reader, m_state, changed);
 }
 
 bool SpaceWriter::Log(std::uint64_t commit, Bytes payload) {
@@ -112,8 +98,7 @@ void SpaceWriter::MakeLog() {
 }
 
 void SpaceWriter::FailChanges(const char* fault) const {
-  const PageTable& changes = PagesOf(kChangesTable);
-  m_state.data->reader->Fail(changes.root.root, changes, fault, {});
+  m_reader.Fail(m_changes.pages.root.root, m_changes.pages, fault, {});
 }
 
 void SpaceWriter::PutRecord(OID oid, std::uint64_t commit, ByteView record) {
@@ -139,7 +124,7 @@ std::uint8_t* SpaceWriter::Reserve(Table& table, std::string_view key, std::size
 // The same behind a tag.
 std::uint8_t* SpaceWriter::ReserveTagged(Table& table, std::string_view key, std::size_t bytes) {
   std::uint8_t* room = Reserve(table, key, kTagBytes + bytes);
-  const std::uint64_t tag = ValueTag(table.pages->seed, key);
+  const std::uint64_t tag = ValueTag(table.pages.seed, key);
   std::memcpy(room, &tag, kTagBytes);
   return room + kTagBytes;
 }
@@ -155,7 +140,7 @@ void SpaceWriter::PutNumber(std::string_view key, std::uint64_t number) {
 }
 
 void SpaceWriter::Remove(Table& table, std::string_view key) {
-  if (Check(table, key)) table.cursor->CheckNeighbours();
+  if (Check(table, key)) table.cursor.CheckNeighbours();
   MDB_val k = ToVal(key);
   const int code = mdb_del(Transaction(), table.handle, &k, nullptr);
   if (code != MDB_NOTFOUND) CheckLmdb(code, kOperation, m_space);

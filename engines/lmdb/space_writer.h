@@ -2,8 +2,7 @@
 //
 // LMDB believes its pages. So before each change the pages are checked that LMDB will read for it, in the state that the
 // transaction began with: the way to the key, the overflow run that is replaced, the neighbours of a leaf that loses an
-// entry. Each of these is checked once in a transaction, whoever has checked it before. What is only looked up is read by the
-// reader that the state has for everybody (KnownState), so that a commit to the log checks nothing twice.
+// entry. Each page is checked once in a transaction.
 #pragma once
 
 #include <functional>
@@ -40,17 +39,13 @@ class SpaceWriter {
 
   // What the writer began with.
   const CommitState& state() const noexcept { return m_state; }
-  // Reads it.
-  PageReader& reader() noexcept { return *m_state.data->reader; }
-  std::uint64_t NextId() { return ReadNextId(reader(), *m_state.data->state); }
+  PageReader& reader() noexcept { return m_reader; }
+  std::uint64_t NextId() { return ReadNextId(m_reader, *m_state.data->state); }
 
-  // The record as it was stored in the state that the writer began with. The view stays until the writer ends. Throws
-  // DamagedStorage.
+  // The record as it was stored, and with its changes as it is, in the state that the writer began with. The view stays
+  // until the writer ends, or `changed` does. Throws DamagedStorage.
   std::optional<StoredRecord> Stored(OID oid);
-  // The same of a record that is put next, by the check that putting it needs in any case; and the record with its changes, a
-  // view that ends with `changed` as well.
-  std::optional<StoredRecord> StoredToPut(OID oid);
-  ByteView CurrentToPut(OID oid, const ChangeIndex& index, Bytes& changed);
+  ByteView CurrentRecord(OID oid, const ChangeIndex& index, Bytes& changed);
 
   // The commit with that payload, instead of any change of a table; false where the log has no room for it.
   bool Log(std::uint64_t commit, Bytes payload);
@@ -81,12 +76,10 @@ class SpaceWriter {
   void PutNextId(std::uint64_t nextId) { PutNumber(kNextIdKey, nextId); }
 
  private:
-  // The last two are absent until something is to be changed in it.
   struct Table {
     unsigned handle;
-    std::string_view name;
-    const PageTable* pages = nullptr;
-    std::optional<TreeCursor> cursor{};
+    const PageTable& pages;
+    TreeCursor cursor;
   };
   // An object id, or the number of a commit.
   struct IdKey {
@@ -96,9 +89,7 @@ class SpaceWriter {
   };
 
   MDB_txn* Transaction() { return m_txn != nullptr ? m_txn : m_txn = m_begin(); }
-  const PageTable& PagesOf(std::string_view table) const;
-  TreeCursor& CursorFor(Table& table);
-  static std::optional<StoredRecord> StoredAt(TreeCursor& cursor, OID oid);
+  Table MakeTable(unsigned handle, std::string_view name);
   Table& Named(NamedTable table) noexcept;
   bool Check(Table& table, std::string_view key);
   std::uint8_t* Reserve(Table& table, std::string_view key, std::size_t bytes);
@@ -113,8 +104,7 @@ class SpaceWriter {
   CommitLog* const m_log;
   std::optional<CommitForLog> m_logged;
   const std::string& m_space;
-  std::optional<TreeCursor> m_lookups;      // in the table of records
-  std::unique_ptr<PageReader> m_ownReader;  // of what LMDB will read; null until something is to be changed
+  PageReader m_reader;
   Table m_records, m_changes, m_info, m_roots, m_meta, m_deletions, m_system;
 };
 

@@ -67,7 +67,7 @@ class PagesCheck {
     const bool isLeaf = levels == 1;
     PageView page;
     try {
-      page = m_reader->Enter(number, place, isLeaf, table, [&] { return bounds; });
+      page = m_reader.Enter(number, place, isLeaf, table, [&] { return bounds; });
     } catch (const DamagedStorage& damaged) {
       Find(damaged);
       tally.isWhole = false;
@@ -93,14 +93,14 @@ class PagesCheck {
     try {
       ByteView value(node.value(), node.hasBigValue() ? 0 : node.valueBytes());
       if (node.hasBigValue()) {
-        value = m_reader->Run(node.bigValuePage(), node.valueBytes(), table, node.key());
+        value = m_reader.Run(node.bigValuePage(), node.valueBytes(), table, node.key());
         const std::uint32_t pages = PageView(value.data() - kPageHeaderBytes).runPages();
         tally.overflowPages += pages;
         UseRun(table, node.bigValuePage(), pages);
       }
       if (!table.isTagged) return;
       if (value.size() < kTagBytes || LoadAs<std::uint64_t>(value.data()) != ValueTag(table.seed, node.key())) {
-        m_reader->Fail(number, table, "the value of a key belongs to another key", {node.key(), node.key()});
+        m_reader.Fail(number, table, "the value of a key belongs to another key", {node.key(), node.key()});
       }
     } catch (const DamagedStorage& damaged) {
       Find(damaged);
@@ -110,12 +110,12 @@ class PagesCheck {
 
   void UseRun(const PageTable& table, PageNumber first, std::uint32_t pages) {
     if (pages > m_state.meta.lastPage - first + 1) {
-      m_reader->Fail(first, table, "its run of pages is longer than the space", {});
+      m_reader.Fail(first, table, "its run of pages is longer than the space", {});
     }
     for (PageNumber page = first; page < first + pages; ++page) {
-      if (!m_used.Add(page)) m_reader->Fail(page, table, "it is reached from two places", {});
+      if (!m_used.Add(page)) m_reader.Fail(page, table, "it is reached from two places", {});
       if (m_state.free != nullptr && m_state.free->Contains(page)) {
-        m_reader->Fail(page, table, "it is in use and among the free pages", {});
+        m_reader.Fail(page, table, "it is in use and among the free pages", {});
       }
     }
   }
@@ -123,8 +123,8 @@ class PagesCheck {
   void CheckNumbers() {
     if (m_state.Table(kSystemTable) == nullptr) return;
     try {
-      ReadNumbers(*m_reader, m_state);
-      ReadNextId(*m_reader, m_state);
+      ReadNumbers(m_reader, m_state);
+      ReadNextId(m_reader, m_state);
     } catch (const DamagedStorage& damaged) {
       Find(damaged);
     }
@@ -141,7 +141,7 @@ class PagesCheck {
   }
 
   const SpaceState& m_state;
-  const std::unique_ptr<PageReader> m_reader;  // its own: what others have checked may have been damaged since
+  PageReader m_reader;
   PageSet m_used;
   StorageReport m_report;
   std::uint64_t m_unlisted = 0;
