@@ -46,7 +46,7 @@ PageReader::PageReader(std::shared_ptr<PageFile> file, std::size_t pageBytes, Pa
       m_lastPage(lastPage),
       m_free(std::move(free)),
       m_space(std::move(space)),
-      m_marks(lastPage) {}
+      m_marks(lastPage / kMarksInChunk + 1) {}
 
 const char* PageReader::FaultOfPlace(PageNumber first, std::uint64_t pages) const {
   if (first < kMetaPages || first > m_lastPage || pages > m_lastPage - first + 1) {
@@ -59,9 +59,10 @@ const char* PageReader::FaultOfPlace(PageNumber first, std::uint64_t pages) cons
 PageView PageReader::EnterFirst(PageNumber number, std::uint64_t place, bool isLeaf, const PageTable& table,
                                 const KeyBounds& bounds) {
   if (const char* fault = FaultOfPlace(number, 1)) Fail(number, table, fault, bounds);
-  constexpr const char* kTwoPlaces = "it is reached from two places";
-  const std::uint64_t mark = m_marks.Of(number);
-  if (mark != 0 && mark != place) Fail(number, table, kTwoPlaces, bounds);
+  std::unique_ptr<std::uint64_t[]>& chunk = m_marks[number / kMarksInChunk];
+  if (chunk == nullptr) chunk = std::make_unique<std::uint64_t[]>(kMarksInChunk);
+  std::uint64_t& mark = chunk[number % kMarksInChunk];
+  if (mark != 0 && mark != place) Fail(number, table, "it is reached from two places", bounds);
   m_file->CountReached();
   const std::uint8_t* bytes = m_file->At(number * m_pageBytes, m_pageBytes);
   if (bytes == nullptr) Fail(number, table, "the file ends before it", bounds);
@@ -70,7 +71,7 @@ PageView PageReader::EnterFirst(PageNumber number, std::uint64_t place, bool isL
   if (!isLeaf && table.order == KeyOrder::kBytes) role.leastNodes = 2;
   const PageView page(bytes);
   if (const char* fault = FaultOfPage(page, m_pageBytes, role)) Fail(number, table, fault, bounds);
-  if (!m_marks.Set(number, place)) Fail(number, table, kTwoPlaces, bounds);
+  mark = place;
   return page;
 }
 

@@ -2,13 +2,12 @@
 //
 // 1. A page is checked when it is first reached: FaultOfPage, with the bounds that its parents hand down, and that it is
 //    not among the free pages: an older version of a page may look as sound as the one that took its place. From then on
-//    the reader remembers from where it was reached, for all who read by it; a page that is reached from two places is damage.
+//    the reader remembers from where it was reached; a page that is reached from two places is damage.
 // 2. So a descent ends after `depth` steps, and a walk through the leaves meets ascending keys only.
 // 3. That a key is absent is proved by the keys beside the place where it would stand. In a tagged table each value
 //    begins with a tag of its table and key, so that a key that was changed does not pass for its neighbour's neighbour.
 //
-// The pages must be kept from being used again: by a transaction of LMDB, or, those of the newest commit, by commits being
-// locked. Any thread may call.
+// The pages must be kept from being used again by a transaction of LMDB. One thread at a time.
 #pragma once
 
 #include <cstdint>
@@ -20,7 +19,6 @@
 #include "engines/lmdb/page_check.h"
 #include "engines/lmdb/page_file.h"
 #include "engines/lmdb/page_format.h"
-#include "engines/lmdb/page_marks.h"
 #include "store/engine.h"
 
 namespace vemo {
@@ -59,7 +57,7 @@ class PageSet {
 
 class PageReader {
  public:
-  // Has checked nothing yet. `free` is null while the list of free pages itself is read, and where that is damaged.
+  // `free` is null while the list of free pages itself is read, and where that is damaged.
   PageReader(std::shared_ptr<PageFile> file, std::size_t pageBytes, PageNumber lastPage,
              std::shared_ptr<const PageSet> free, std::string space);
 
@@ -67,8 +65,11 @@ class PageReader {
   // called when the page is reached for the first time, and gives the bounds of its keys.
   template <typename Bounds>
   PageView Enter(PageNumber number, std::uint64_t place, bool isLeaf, const PageTable& table, const Bounds& bounds) {
-    if (number <= m_lastPage && m_marks.Of(number) == place) {
-      if (const std::uint8_t* page = m_file->At(number * m_pageBytes, m_pageBytes)) return PageView(page);
+    if (number <= m_lastPage) {
+      const std::uint64_t* marks = m_marks[number / kMarksInChunk].get();
+      if (marks != nullptr && marks[number % kMarksInChunk] == place) {
+        if (const std::uint8_t* page = m_file->At(number * m_pageBytes, m_pageBytes)) return PageView(page);
+      }
     }
     return EnterFirst(number, place, isLeaf, table, bounds());
   }
@@ -90,6 +91,8 @@ class PageReader {
   const std::string& space() const noexcept { return m_space; }
 
  private:
+  static constexpr std::size_t kMarksInChunk = 512;
+
   PageView EnterFirst(PageNumber number, std::uint64_t place, bool isLeaf, const PageTable& table,
                       const KeyBounds& bounds);
   // Why the pages from `first` on cannot belong to a table; null where they can.
@@ -100,7 +103,7 @@ class PageReader {
   const PageNumber m_lastPage;
   const std::shared_ptr<const PageSet> m_free;
   const std::string m_space;
-  PageMarks m_marks;
+  std::vector<std::unique_ptr<std::uint64_t[]>> m_marks;  // by page, the place from which it was reached, or 0
 };
 
 }  // namespace vemo
