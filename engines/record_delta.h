@@ -20,8 +20,9 @@ namespace vemo {
 // search of bounded width where they part; not always the shortest. Throws std::bad_alloc alone.
 std::optional<Bytes> RecordDelta(ByteView old, ByteView next, std::size_t mostBytes);
 
-// Makes of `next` the version to which `delta` leads from `old`, in the room that it has as far as it has some. Throws MalformedBytes
-// when the two do not fit together, and what `next` is then is not told. What it allocates is bounded by the sizes of both.
+// Makes of `next`, in which neither of the two lies, the version to which `delta` leads from `old`; its room is used again.
+// Throws MalformedBytes when the two do not fit together, and then `next` may be anything. What it allocates is bounded by the
+// sizes of both.
 void ApplyRecordDelta(ByteView old, ByteView delta, Bytes& next);
 
 }  // namespace vemo

@@ -24,8 +24,8 @@ WT_ITEM ToItem(std::string_view bytes) {
 class WiredTigerPeer : public BytesPeer {
  public:
   explicit WiredTigerPeer(const StoreSetup& setup) : BytesPeer(setup) {
-    // A transaction keeps the pages that it changes in the cache, of 32 KiB and more: one of a thousand keys that lie apart is rolled
-    // back, as often as it is tried, where there is less room. So its bounded cache is larger than others'.
+    // A transaction keeps the pages that it changes in the cache, of 32 KiB and more: one of a thousand keys that lie apart is
+    // rolled back, as often as it is tried, where there is less room. So its bounded cache is larger than others'.
     const std::uint64_t cacheBytes = std::max<std::uint64_t>(setup.CacheBytes(), 64U << 20);
     const std::string options = "create,cache_size=" + std::to_string(cacheBytes) +
                                 ",log=(enabled=true),transaction_sync=(enabled=true,method=fsync)";

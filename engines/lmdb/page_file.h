@@ -36,7 +36,8 @@ class PageFile {
     if (m_reached.load(std::memory_order_relaxed) < kFewPages && m_reached.fetch_add(1) + 1 == kFewPages) ReadAhead();
   }
 
-  // These bytes will be read soon: while the file is new to this process, the system is asked to read them from the disk meanwhile.
+  // These bytes will be read soon: while the file is new to this process, the system is asked to read them from the disk
+  // meanwhile.
   void WillNeed(std::uint64_t offset, std::uint64_t bytes) noexcept {
     if (m_asked.load(std::memory_order_relaxed) < kMostAsked && m_asked.fetch_add(1) < kMostAsked) AskFor(offset, bytes);
   }
@@ -51,7 +52,8 @@ class PageFile {
  private:
   // Opening a space reaches some tens of pages, and one at least for each commit that has left changes which wait.
   static constexpr int kFewPages = 256;
-  // Opening asks for the roots of the tables, the list of free pages and the changes that wait.
+  // Opening asks for the roots of the tables, the list of free pages and the changes that wait; what is left is for the first big
+  // values that are read.
   static constexpr int kMostAsked = 64;
 
   void AskFor(std::uint64_t offset, std::uint64_t bytes) noexcept;
