@@ -3,6 +3,7 @@
 #include <array>
 #include <map>
 #include <mutex>
+#include <type_traits>
 
 #include "store/object_memory.h"
 
@@ -41,23 +42,24 @@ const ReflectedInterface& _GetReflected(const IPersistable*) {
 namespace {
 
 template <class T>
-ClassEntry MakeEntry(bool isMap, std::size_t index) {
+ClassEntry MakeEntry(bool isMap) {
+  static_assert(std::is_nothrow_default_constructible_v<T>);  // NodeBlocks constructs in memory that nobody else holds
   return {GetReflectedClass<T>(), IPersistable::Stubs<T>::GetTable(),
           [](BoundedReader& reader) { CheckForm(reader, static_cast<const T*>(nullptr)); },
-          [](const void* object) { return MemoryBytesOf(static_cast<const T*>(object)); }, isMap, index};
+          [](const void* object) { return MemoryBytesOf(static_cast<const T*>(object)); }, isMap};
 }
 
 const std::array<ClassEntry, kNumClasses>& Entries() {
   static const std::array<ClassEntry, kNumClasses> entries = {
-      MakeEntry<FieldIdToVectorInsertionsMap>(true, 0),
-      MakeEntry<FieldIdToVectorInsertionsMapInternalNode>(false, 1),
-      MakeEntry<FieldIdToVectorInsertionsMapLeafNode>(false, 2),
-      MakeEntry<FieldIdToVectorTombstonesMap>(true, 3),
-      MakeEntry<FieldIdToVectorTombstonesMapInternalNode>(false, 4),
-      MakeEntry<FieldIdToVectorTombstonesMapLeafNode>(false, 5),
-      MakeEntry<FieldIdToVectorInsertionsAndDeletionsMap>(true, 6),
-      MakeEntry<FieldIdToVectorInsertionsAndDeletionsMapInternalNode>(false, 7),
-      MakeEntry<FieldIdToVectorInsertionsAndDeletionsMapLeafNode>(false, 8),
+      MakeEntry<FieldIdToVectorInsertionsMap>(true),
+      MakeEntry<FieldIdToVectorInsertionsMapInternalNode>(false),
+      MakeEntry<FieldIdToVectorInsertionsMapLeafNode>(false),
+      MakeEntry<FieldIdToVectorTombstonesMap>(true),
+      MakeEntry<FieldIdToVectorTombstonesMapInternalNode>(false),
+      MakeEntry<FieldIdToVectorTombstonesMapLeafNode>(false),
+      MakeEntry<FieldIdToVectorInsertionsAndDeletionsMap>(true),
+      MakeEntry<FieldIdToVectorInsertionsAndDeletionsMapInternalNode>(false),
+      MakeEntry<FieldIdToVectorInsertionsAndDeletionsMapLeafNode>(false),
   };
   return entries;
 }
@@ -92,5 +94,7 @@ const ClassEntry* FindClass(const IPersistable::FnTable* table) {
   }
   return nullptr;
 }
+
+std::size_t IndexOf(const ClassEntry& classEntry) { return static_cast<std::size_t>(&classEntry - Entries().data()); }
 
 }  // namespace vemo

@@ -17,7 +17,6 @@ struct ClassEntry {
   void (*checkForm)(BoundedReader& reader);  // throws MalformedBytes on a body that Deserialise must not see
   std::size_t (*memoryBytes)(const void* object);  // what it takes in memory, its heap included
   bool isMap;
-  std::size_t index;  // below kNumClasses
 
   std::string_view Name() const noexcept { return reflected->m_name; }
 };
@@ -28,5 +27,8 @@ void RegisterMapClasses();
 // Null when there is none. The classes must have been registered. Entries live as long as the process.
 const ClassEntry* FindClass(std::string_view name);
 const ClassEntry* FindClass(const IPersistable::FnTable* table);
+
+// A number below kNumClasses for each.
+std::size_t IndexOf(const ClassEntry& classEntry);
 
 }  // namespace vemo

@@ -1,8 +1,8 @@
 // The memory of nodes that have left a view, for those that it loads next.
 //
-// A node takes several kilobytes, and its lists many small pieces. Whenever malloc is asked for a large piece, it first puts small
-// ones together that were freed, and takes them apart again for the lists of that node. A view whose memory is bounded would have
-// it do so with nearly every node.
+// A node takes several kilobytes, and its lists many small pieces. Whenever malloc is asked for a large piece, it first puts
+// small ones together that were freed, and takes them apart again for the lists of that node. A view whose memory is bounded
+// would have it do so with nearly every node.
 #pragma once
 
 #include <array>
@@ -35,7 +35,7 @@ class NodeBlocks {
   struct Block {
     Block* next;
   };
-  Block*& First(const ClassEntry& classEntry) noexcept { return m_first[classEntry.index]; }
+  Block*& First(const ClassEntry& classEntry) noexcept { return m_first[IndexOf(classEntry)]; }
 
   std::array<Block*, kNumClasses> m_first{};  // of the blocks kept for each class
   std::size_t m_bytes = 0;

@@ -118,15 +118,16 @@ void View::Unbind(const IdSet& ids) const {
 }
 
 bool View::Trim(std::size_t allowance) {
+  const std::size_t room = Residents::RoomBelow(allowance);
+  if (m_blocks.bytes() > room) m_blocks.Clear();
   if (m_residents.EvictableBytes() <= allowance) return false;
-  constexpr std::size_t kPartKept = 10;  // what a choice leaves free
   m_blocks.Clear();
   const Residents::Choice choice = m_residents.Choose(allowance);
   Unbind(choice.unbound);
   for (const OID oid : choice.leaving) {
     const ptr<IPersistable> object = Find(oid);
     Release(oid);
-    m_blocks.End(object, allowance / kPartKept);
+    m_blocks.End(object, room);
   }
   CacheCounters::Add(m_counters.evictions, choice.leaving.size());
   CacheCounters::Add(m_counters.passes, 1);
