@@ -1,5 +1,5 @@
 // What checking LMDB's pages costs: random reads of records by the engine and by mdb_get, from one file; the first read of
-// a page in a process; opening a snapshot; commits of one record.
+// a page in a snapshot; opening a snapshot; commits of one record.
 //
 //   lmdb_pages FOLDER [RECORDS]     makes a space of that many records (16,000) of 1,100 bytes in FOLDER
 #include <lmdb.h>
@@ -126,7 +126,7 @@ int main(int argc, char** argv) {
     std::printf("opening and closing a snapshot: %.0f ns\n", Median(openings));
     const auto snapshot = engine->OpenSnapshot();
     const std::vector<std::uint64_t> few(ids.begin(), ids.begin() + 2000);
-    std::printf("reading a record, mostly for the first time: %.0f ns\n", ReadByEngine(*snapshot, few));
+    std::printf("reading a record, mostly for the first time in the snapshot: %.0f ns\n", ReadByEngine(*snapshot, few));
     ReadByEngine(*snapshot, ids);
     std::printf("reading a record again: %.0f ns\n", ReadByEngine(*snapshot, ids));
   }
