@@ -3,7 +3,6 @@
 #include <array>
 #include <map>
 #include <mutex>
-#include <type_traits>
 
 #include "store/object_memory.h"
 
@@ -43,14 +42,13 @@ namespace {
 
 template <class T>
 ClassEntry MakeEntry(bool isMap) {
-  static_assert(std::is_nothrow_default_constructible_v<T>);  // NodeBlocks constructs in memory that nobody else holds
   return {GetReflectedClass<T>(), IPersistable::Stubs<T>::GetTable(),
           [](BoundedReader& reader) { CheckForm(reader, static_cast<const T*>(nullptr)); },
           [](const void* object) { return MemoryBytesOf(static_cast<const T*>(object)); }, isMap};
 }
 
-const std::array<ClassEntry, kNumClasses>& Entries() {
-  static const std::array<ClassEntry, kNumClasses> entries = {
+const std::array<ClassEntry, 9>& Entries() {
+  static const std::array<ClassEntry, 9> entries = {
       MakeEntry<FieldIdToVectorInsertionsMap>(true),
       MakeEntry<FieldIdToVectorInsertionsMapInternalNode>(false),
       MakeEntry<FieldIdToVectorInsertionsMapLeafNode>(false),
@@ -94,7 +92,5 @@ const ClassEntry* FindClass(const IPersistable::FnTable* table) {
   }
   return nullptr;
 }
-
-std::size_t IndexOf(const ClassEntry& classEntry) { return static_cast<std::size_t>(&classEntry - Entries().data()); }
 
 }  // namespace vemo

@@ -9,8 +9,6 @@
 
 namespace vemo {
 
-inline constexpr std::size_t kNumClasses = 9;
-
 struct ClassEntry {
   const ReflectedClass* reflected;
   const IPersistable::FnTable* table;
@@ -27,8 +25,5 @@ void RegisterMapClasses();
 // Null when there is none. The classes must have been registered. Entries live as long as the process.
 const ClassEntry* FindClass(std::string_view name);
 const ClassEntry* FindClass(const IPersistable::FnTable* table);
-
-// A number below kNumClasses for each.
-std::size_t IndexOf(const ClassEntry& classEntry);
 
 }  // namespace vemo

@@ -10,13 +10,9 @@ PersistObjState& PersistStateOf(ptr<const IPersistable> object) noexcept {
   return *object.Table()->GetPersistObjState(object.m_self);
 }
 
-void PrepareToEnd(ptr<IPersistable> object) noexcept {
+void DestroyObject(ptr<IPersistable> object) noexcept {
   SysStateOf(object).ClearFlag(ObjSysState::kDirtyFlag);
   object.Table()->_IObject.OnGarbageCollect(object.m_self);
-}
-
-void DestroyObject(ptr<IPersistable> object) noexcept {
-  PrepareToEnd(object);
   object.Table()->_IObject.Destroy(object.m_self);
 }
 

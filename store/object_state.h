@@ -12,9 +12,7 @@ inline constexpr int kDeletedFlag = 3;   // the object was deleted in the open t
 ObjSysState& SysStateOf(ptr<const IPersistable> object) noexcept;
 PersistObjState& PersistStateOf(ptr<const IPersistable> object) noexcept;
 
-// Clears the dirty flag and tells the object that it is collected.
-void PrepareToEnd(ptr<IPersistable> object) noexcept;
-// The same, and ends it and its memory.
+// Clears the dirty flag, tells the object that it is collected, and ends it.
 void DestroyObject(ptr<IPersistable> object) noexcept;
 
 }  // namespace vemo

@@ -102,10 +102,8 @@ Residents::Table Residents::TakeAll() noexcept {
   return std::exchange(m_table, Table());
 }
 
-std::size_t Residents::RoomBelow(std::size_t allowance) noexcept { return allowance - allowance / 10 * kGoalTenths; }
-
 Residents::Choice Residents::Choose(std::size_t allowance) {
-  const std::size_t goal = allowance - RoomBelow(allowance);
+  const std::size_t goal = allowance / 10 * kGoalTenths;
   std::size_t bytes = EvictableBytes();
   Choice choice;
   std::vector<OID> candidates;

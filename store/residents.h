@@ -81,9 +81,6 @@ class Residents {
   // throws std::bad_alloc, which leaves everything as it was.
   Choice Choose(std::size_t allowance);
 
-  // How far below `allowance` a choice goes.
-  static std::size_t RoomBelow(std::size_t allowance) noexcept;
-
   const Table& All() const noexcept { return m_table; }
 
  private:

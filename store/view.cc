@@ -118,16 +118,13 @@ void View::Unbind(const IdSet& ids) const {
 }
 
 bool View::Trim(std::size_t allowance) {
-  const std::size_t room = Residents::RoomBelow(allowance);
-  if (m_blocks.bytes() > room) m_blocks.Clear();
   if (m_residents.EvictableBytes() <= allowance) return false;
-  m_blocks.Clear();
   const Residents::Choice choice = m_residents.Choose(allowance);
   Unbind(choice.unbound);
   for (const OID oid : choice.leaving) {
     const ptr<IPersistable> object = Find(oid);
     Release(oid);
-    m_blocks.End(object, room);
+    DestroyObject(object);
   }
   CacheCounters::Add(m_counters.evictions, choice.leaving.size());
   CacheCounters::Add(m_counters.passes, 1);
@@ -217,7 +214,7 @@ ptr<IPersistable> View::Decode(OID oid, ByteView record, const IPersistable::FnT
     BoundedReader reader(envelope.body);
     classEntry.checkForm(reader);
     reader.ExpectEnd();
-    object = m_blocks.Create(classEntry);
+    object = ptr<IPersistable>(classEntry.reflected->m_createFn().m_self, classEntry.table);
     ReadBody(object, envelope.body);
     return object;
   } catch (const MalformedBytes& malformed) {
@@ -259,7 +256,6 @@ void View::ForgetResidents() noexcept {
     forgotten = m_residents.TakeAll();
   }
   for (const auto& [oid, resident] : forgotten) DestroyObject(resident.object);
-  m_blocks.Clear();
   m_roots.Forget();
 }
 

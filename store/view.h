@@ -31,7 +31,6 @@
 #include "store/class_numbers.h"
 #include "store/class_registry.h"
 #include "store/engine.h"
-#include "store/node_blocks.h"
 #include "store/object_state.h"
 #include "store/residents.h"
 #include "store/root_maps.h"
@@ -139,7 +138,6 @@ class View {
   ClassNumbers m_classes;
   mutable std::mutex m_residentsMutex;  // held where the residents change, for Holds
   Residents m_residents;
-  NodeBlocks m_blocks;  // of residents that were ended for the sake of memory
   UseCheck m_use;
   CacheCounters& m_counters;
   RootMaps m_roots;
