@@ -1,6 +1,5 @@
 #include "tests/support/failing_disk.h"
 
-#include <dlfcn.h>
 #include <errno.h>
 #include <sys/types.h>
 #include <sys/uio.h>
@@ -9,7 +8,11 @@
 #include <filesystem>
 #include <utility>
 
+#include "tests/support/next_function.h"
+
 namespace {
+
+using vemo::test::NextFunction;
 
 // Of the thread that tests; 0 means that none is to fail.
 thread_local int t_untilFailure = 0;
@@ -36,12 +39,6 @@ std::string NameOf(int file) {
   return std::filesystem::read_symlink("/proc/self/fd/" + std::to_string(file), error).filename().string();
 }
 
-// The function of that name behind this one: the system's, or that of a library which watches the disk.
-template <class Function>
-Function Next(const char* name) noexcept {
-  return reinterpret_cast<Function>(::dlsym(RTLD_NEXT, name));
-}
-
 template <class Result, class Call>
 Result FailOr(Call&& call) noexcept {
   if (!Fails()) return call();
@@ -55,7 +52,7 @@ Result FailOr(Call&& call) noexcept {
 extern "C" {
 
 ssize_t pwrite(int file, const void* data, size_t size, off_t offset) {
-  static const auto next = Next<ssize_t (*)(int, const void*, size_t, off_t)>("pwrite");
+  static const auto next = NextFunction<ssize_t (*)(int, const void*, size_t, off_t)>("pwrite");
   const ssize_t done = FailOr<ssize_t>([&] { return next(file, data, size, offset); });
   if (done < 0 || !g_afterWrite) return done;
   const int code = g_afterWrite({NameOf(file), size, offset});
@@ -64,16 +61,16 @@ ssize_t pwrite(int file, const void* data, size_t size, off_t offset) {
   return -1;
 }
 ssize_t writev(int file, const iovec* parts, int count) {
-  static const auto next = Next<ssize_t (*)(int, const iovec*, int)>("writev");
+  static const auto next = NextFunction<ssize_t (*)(int, const iovec*, int)>("writev");
   return FailOr<ssize_t>([&] { return next(file, parts, count); });
 }
 int fdatasync(int file) {
-  static const auto next = Next<int (*)(int)>("fdatasync");
+  static const auto next = NextFunction<int (*)(int)>("fdatasync");
   if (g_beforeSync) g_beforeSync(NameOf(file));
   return FailOr<int>([&] { return next(file); });
 }
 int fsync(int file) {
-  static const auto next = Next<int (*)(int)>("fsync");
+  static const auto next = NextFunction<int (*)(int)>("fsync");
   if (g_beforeSync) g_beforeSync(NameOf(file));
   return FailOr<int>([&] { return next(file); });
 }
