@@ -63,6 +63,13 @@ std::vector<std::uint64_t> LogTail::Changing(std::uint64_t after, std::uint64_t 
   return {std::upper_bound(m_changing.begin(), end, after), end};
 }
 
+std::optional<std::pair<std::uint64_t, std::uint64_t>> LogTail::ChangingBounds(std::uint64_t last) const {
+  const std::shared_lock lock(m_mutex);
+  const auto end = std::upper_bound(m_changing.begin(), m_changing.end(), last);
+  if (end == m_changing.begin()) return std::nullopt;
+  return std::pair(m_changing.front(), *std::prev(end));
+}
+
 std::optional<ByteView> LogTail::Changes(std::uint64_t commit) const {
   const std::shared_lock lock(m_mutex);
   const std::optional<LoggedCommit>& found = m_commits.at(commit - m_base - 1);

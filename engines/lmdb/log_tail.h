@@ -15,6 +15,7 @@
 #include <shared_mutex>
 #include <string>
 #include <string_view>
+#include <utility>
 #include <vector>
 
 #include "engines/lmdb/log_entry.h"
@@ -49,6 +50,8 @@ class LogTail {
   // The commits behind `after` and up to `last` that have changes of records or are damaged, in ascending
   // order.
   std::vector<std::uint64_t> Changing(std::uint64_t after, std::uint64_t last) const;
+  // The first and the last of all of these up to `last`, without listing them.
+  std::optional<std::pair<std::uint64_t, std::uint64_t>> ChangingBounds(std::uint64_t last) const;
 
   // What that commit, behind the base and not behind the last one, changed of records: empty for nothing.
   // Nothing where the commit is damaged.

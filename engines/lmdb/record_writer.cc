@@ -43,10 +43,10 @@ RecordWriter::RecordWriter(SpaceWriter& writer, const ChangeIndex& index, const 
       m_commit(writer.state().Commit() + 1),
       m_tail(*writer.state().log.tail),
       m_kept(writer.state().data->numbers.changes) {
-  const std::vector<std::uint64_t> logged = m_tail.Changing(m_tail.base(), m_commit - 1);
-  if (logged.empty()) return;
-  if (m_kept.first == 0) m_kept.first = logged.front();
-  m_kept.last = logged.back();
+  const auto logged = m_tail.ChangingBounds(m_commit - 1);
+  if (!logged) return;
+  if (m_kept.first == 0) m_kept.first = logged->first;
+  m_kept.last = logged->second;
 }
 
 void RecordWriter::Write(const CommitBatch& batch) {

@@ -27,6 +27,9 @@ TEST(LogTails, TellWhichCommitsHaveChanges) {
   EXPECT_EQ(tail.Changing(10, 15), (std::vector<std::uint64_t>{12, 14, 15}));
   EXPECT_EQ(tail.Changing(12, 14), std::vector<std::uint64_t>{14});
   EXPECT_TRUE(tail.Changing(15, 12).empty()) << "for a snapshot that is older than what somebody has read";
+  EXPECT_EQ(tail.ChangingBounds(15), std::pair(std::uint64_t{12}, std::uint64_t{15}));
+  EXPECT_EQ(tail.ChangingBounds(13), std::pair(std::uint64_t{12}, std::uint64_t{12}));
+  EXPECT_EQ(tail.ChangingBounds(11), std::nullopt);
   EXPECT_EQ(tail.Last(), 15u);
   EXPECT_EQ(tail.End(), 2'000u);
   EXPECT_FALSE(tail.HasDamage(14));
