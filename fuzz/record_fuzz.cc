@@ -1,7 +1,11 @@
 // Records of all nine classes, with a seal that is right and without: what the check of the form accepts is read without a fault
-// and written as the same bytes, and the second reader (store/raw_record.h) accepts exactly the same.
+// and written as the same bytes, and the second reader (store/raw_record.h) accepts exactly the same, as does whoever reads the entries
+// of a leaf one by one.
+#include <algorithm>
 #include <cstdlib>
 #include <memory>
+#include <optional>
+#include <string_view>
 
 #include "platform/error.h"
 #include "store/envelope.h"
@@ -41,6 +45,37 @@ bool RawAccepts(ByteView record, OID oid, const RawClassTable& classes) {
   }
 }
 
+// Whether all entries can be read; what they are must be written as the bytes of `body` behind its head.
+template <class Traits>
+bool EntriesAccept(ByteView body) {
+  Bytes entries;
+  try {
+    LeafFormReader<Traits> reader{BoundedReader(body)};
+    FieldId key;
+    typename Traits::Payload payload;
+    while (reader.NextKey()) {
+      reader.Read(key, payload);
+      if (reader.CompareKeyWith(key) != 0) std::abort();
+      for (const Bytes& bytes : {ToBytes(key), ToBytes(payload)}) entries.insert(entries.end(), bytes.begin(), bytes.end());
+    }
+  } catch (const MalformedBytes&) {
+    return false;
+  }
+  if (entries.size() > body.size() || !std::equal(entries.rbegin(), entries.rend(), body.rbegin())) std::abort();
+  return true;
+}
+
+// Nothing for a class that is no leaf's.
+std::optional<bool> LeafEntriesAccept(std::string_view className, ByteView body) {
+  if (className == "vemo::FieldIdToVectorInsertionsMapLeafNode")
+    return EntriesAccept<FieldIdToVectorInsertionsMapTraits>(body);
+  if (className == "vemo::FieldIdToVectorTombstonesMapLeafNode")
+    return EntriesAccept<FieldIdToVectorTombstonesMapTraits>(body);
+  if (className == "vemo::FieldIdToVectorInsertionsAndDeletionsMapLeafNode")
+    return EntriesAccept<FieldIdToVectorInsertionsAndDeletionsMapTraits>(body);
+  return std::nullopt;
+}
+
 }  // namespace
 
 extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* data, std::size_t size) {
@@ -51,7 +86,8 @@ extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* data, std::size_t size
   const OID oid(7);
   const ByteView input(data + 1, size - 1);
   Bytes record;
-  if (data[0] < 250) {
+  const bool isSealed = data[0] < 250;
+  if (isSealed) {
     BeginRecord(record, 1 + data[0] % 9u, 3);
     record.insert(record.end(), input.begin(), input.end());
     SealRecord(record, 0, oid);
@@ -72,5 +108,9 @@ extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* data, std::size_t size
     isAccepted = false;
   }
   if (RawAccepts(record, oid, classes) != isAccepted) std::abort();
+  if (isSealed) {
+    const auto leaf = LeafEntriesAccept(snapshot.Objects().ClassInHead(record), OpenRecord(record, oid).body);
+    if (leaf && *leaf != isAccepted) std::abort();
+  }
   return 0;
 }

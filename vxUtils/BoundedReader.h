@@ -29,6 +29,8 @@ class BoundedReader {
 
   std::size_t offset() const noexcept { return static_cast<std::size_t>(m_at - m_begin); }
   std::size_t remaining() const noexcept { return static_cast<std::size_t>(m_end - m_at); }
+  // Where it has got to: an InputArchive reads from there what a copy of the reader has accepted.
+  const std::uint8_t* at() const noexcept { return m_at; }
 
   // Variable-length values; a form that is longer than its value needs is refused.
   std::uint32_t ReadUint32() { return static_cast<std::uint32_t>(ReadNumber(UINT32_MAX)); }

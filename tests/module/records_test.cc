@@ -272,6 +272,64 @@ TEST(RefusedRecords, OfNodes) {
   });
 }
 
+// The keys and payloads of a leaf, read one by one.
+std::vector<std::pair<std::uint64_t, std::uint64_t>> EntriesOf(const Bytes& record) {
+  std::vector<std::pair<std::uint64_t, std::uint64_t>> entries;
+  LeafFormReader<SmallMapTraits> reader{BoundedReader(record)};
+  FieldId key;
+  SmallMap::Payload payload;
+  while (reader.NextKey()) {
+    reader.Read(key, payload);
+    entries.emplace_back(NumberOf(key), PayloadNumber<SmallMap::Payload>::Number(payload));
+  }
+  return entries;
+}
+
+TEST_F(Records, OfALeafAreReadEntryByEntry) {
+  Build("([1 2] 10 [10 11 12])");
+  EXPECT_TRUE(EntriesOf({1, 0, 0, 0}).empty());
+  EXPECT_EQ(EntriesOf(ToBytes(*Leaf(2))), (std::vector<std::pair<std::uint64_t, std::uint64_t>>{{10, 10}, {11, 11}, {12, 12}}));
+}
+
+TEST_F(Records, OfALeafAreComparedWithAKeyWithoutTheirPayloads) {
+  const FieldId wide{OID(7), Path{1, 300}}, deep{OID(7), Path{1, 300, 70'000, 1, 2, 3, 4}};
+  map.Insert(wide, PayloadNumber<SmallMap::Payload>::Make(1), false);
+  map.Insert(deep, PayloadNumber<SmallMap::Payload>::Make(2), false);
+  const Bytes record = ToBytes(*map.m_firstLeaf.Get());
+  LeafFormReader<SmallMapTraits> reader{BoundedReader(record)};
+  ASSERT_TRUE(reader.NextKey());
+  EXPECT_EQ(reader.CompareKeyWith(wide), 0);
+  EXPECT_EQ(reader.CompareKeyWith(deep), -1);
+  EXPECT_EQ(reader.CompareKeyWith(FieldId{OID(7), Path{1, 299}}), 1);
+  EXPECT_EQ(reader.CompareKeyWith(FieldId{OID(6), Path{9}}), 1);
+  EXPECT_EQ(reader.CompareKeyWith(FieldId{OID(8), Path{}}), -1);
+  reader.SkipPayload();
+  ASSERT_TRUE(reader.NextKey());
+  EXPECT_EQ(reader.CompareKeyWith(deep), 0);
+  EXPECT_EQ(reader.CompareKeyWith(wide), 1);
+  reader.SkipPayload();
+  EXPECT_FALSE(reader.NextKey());
+}
+
+TEST(RefusedRecords, OfLeavesAreRefusedEntryByEntryToo) {
+  const std::vector<Refusal> rows = {
+      {{1, 0, 0, 5}, 4, "a node cannot hold 5 entries"},
+      {{1, 3, 3, 0}, 3, "a leaf has the same neighbour on both sides"},
+      {{1, 0, 0, 2, 2, 0, 1, 1, 0, 1}, 9, "the keys of a node do not ascend"},
+      {{1, 0, 0, 1, 7, 0}, 6, "end"},
+      {{1, 0, 0, 1, 7, 0, 8, 9}, 7, "the record should end here"},
+  };
+  for (const Refusal& row : rows) {
+    try {
+      EntriesOf(row.m_bytes);
+      ADD_FAILURE() << "accepted: " << row.m_reason;
+    } catch (const MalformedBytes& error) {
+      EXPECT_EQ(error.offset(), row.m_offset) << error.what();
+      EXPECT_NE(std::string(error.what()).find(row.m_reason), std::string::npos) << error.what();
+    }
+  }
+}
+
 TEST(RefusedRecords, LeaveTheObjectAsItWas) {
   SmallMapLeafNode leaf;
   const Bytes sound{1, 0, 0, 1, 7, 0, 8};

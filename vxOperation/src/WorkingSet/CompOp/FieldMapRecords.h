@@ -144,8 +144,14 @@ class KeyOrderCheck {
     if (m_previous.steps != nullptr && !FieldForm::IsBefore(m_previous, key)) [[unlikely]] {
       reader.Fail("the keys of a node do not ascend");
     }
-    m_previous = key;
+    // One by one: as a whole it would be put together in memory first, and the copy wait for that.
+    m_previous.object = key.object;
+    m_previous.head = key.head;
+    m_previous.steps = key.steps;
+    m_previous.bytes = key.bytes;
   }
+  // The key that was read last.
+  const FieldForm& Last() const noexcept { return m_previous; }
 
  private:
   FieldForm m_previous;  // without steps before the first
@@ -188,13 +194,19 @@ void CheckForm(BoundedReader& reader, const TFieldMapInternalNode<Traits>*) {
   reader = entries;
 }
 
+// What stands before a leaf's entries; returns their number.
 template <class Traits>
-void CheckForm(BoundedReader& reader, const TFieldMapLeafNode<Traits>*) {
+std::uint32_t ReadLeafHead(BoundedReader& reader) {
   reader.ReadSchema(Traits::kLeafNodeSchema);
   const std::uint64_t prev = reader.ReadUint64();
   const std::uint64_t next = reader.ReadUint64();
   if (prev == next && prev != 0) reader.Fail("a leaf has the same neighbour on both sides");
-  const std::uint32_t n = CheckNodeCount(reader, 0, Traits::kCapacity);
+  return CheckNodeCount(reader, 0, Traits::kCapacity);
+}
+
+template <class Traits>
+void CheckForm(BoundedReader& reader, const TFieldMapLeafNode<Traits>*) {
+  const std::uint32_t n = ReadLeafHead<Traits>(reader);
   BoundedReader entries = reader;  // as for internal nodes
   KeyOrderCheck keys;
   for (std::uint32_t i = 0; i < n; ++i) {
@@ -203,6 +215,55 @@ void CheckForm(BoundedReader& reader, const TFieldMapLeafNode<Traits>*) {
   }
   reader = entries;
 }
+
+// Goes through the record of a leaf entry by entry, without building the node. Checks as CheckForm does, as far as it is read:
+// each function throws MalformedBytes for what does not fit. The record must live as long.
+template <class Traits>
+class LeafFormReader {
+ public:
+  using Payload = typename Traits::Payload;
+
+  explicit LeafFormReader(BoundedReader record) : m_record(record), m_left(ReadLeafHead<Traits>(m_record)) {}
+
+  // Whether there is another entry, of which the key is read then. What the entry holds is to be read, or skipped, next.
+  bool NextKey() {
+    if (m_left == 0) {
+      m_record.ExpectEnd();
+      return false;
+    }
+    --m_left;
+    m_keyBegin = m_record.at();
+    m_keys.ReadNext(m_record);
+    return true;
+  }
+  // As CompareKeys of that key and `other`.
+  int CompareKeyWith(const FieldId& other) const {
+    const FieldForm& key = m_keys.Last();
+    if (key.object != other.oid.m_value) return key.object < other.oid.m_value ? -1 : 1;
+    const std::uint8_t* step = key.steps;
+    const std::uint8_t* const end = key.steps + key.bytes;
+    for (const Path::Element theirs : other.path.elements()) {
+      if (step == end) return -1;
+      Path::Element ours = 0;
+      step = DeserialiseVariableLengthUint32(step, ours);
+      if (ours != theirs) return ours < theirs ? -1 : 1;
+    }
+    return step == end ? 0 : 1;
+  }
+
+  void SkipPayload() { CheckForm(m_record, static_cast<const Payload*>(nullptr)); }
+  void Read(FieldId& key, Payload& payload) {
+    SkipPayload();
+    InputArchive entry(m_keyBegin);
+    entry >> key >> payload;
+  }
+
+ private:
+  BoundedReader m_record;
+  std::uint32_t m_left;  // entries, of which the key is not read yet
+  KeyOrderCheck m_keys;
+  const std::uint8_t* m_keyBegin = nullptr;
+};
 
 // --- The forms that ToBytes, FromBytes and ToText look for ---
 
