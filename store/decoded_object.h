@@ -4,7 +4,8 @@
 #include <string>
 #include <utility>
 
-#include "store/snapshot.h"
+#include "store/class_registry.h"
+#include "store/view.h"
 
 namespace vemo {
 
@@ -33,21 +34,14 @@ class DecodedObject {
   ptr<IPersistable> m_object;
 };
 
-// Reads nodes of a snapshot's maps. Throws what View::Resolve throws for the same record.
+// Reads nodes of a view's maps. Throws what View::Resolve throws for the same record.
 class NodeReader {
  public:
-  explicit NodeReader(Snapshot& snapshot) noexcept : m_view(snapshot.Objects()) {}
+  explicit NodeReader(View& view) noexcept : m_view(view) {}
 
-  // The node behind a reference that is not empty. Throws CorruptRecord where it is of another class than `expected`.
+  // The node behind a reference that is not empty, as it is stored. Throws CorruptRecord where it is of another class than `expected`.
   DecodedObject Read(const prefbase& reference, const IPersistable::FnTable* expected) const {
-    const std::optional<ByteView> record = m_view.State().Read(reference.m_oid);
-    if (!record) {
-      const std::string_view className = FindClass(expected)->Name();
-      throw DanglingReference(
-          m_view.Describe(reference.m_oid, className, "it is referred to, but there is no record of it (run vemo verify)"),
-          m_view.Place(reference.m_oid, className));
-    }
-    DecodedObject object(m_view.Decode(reference.m_oid, *record, expected));
+    DecodedObject object(m_view.Decode(reference.m_oid, m_view.RequireRecord(reference.m_oid, expected), expected));
     if (object.Get().Table() != expected) m_view.RefuseClass(reference.m_oid, object.Get().Table(), expected);
     return object;
   }

@@ -11,7 +11,7 @@ namespace {
 template <class Map>
 class MapDump {
  public:
-  MapDump(Snapshot& snapshot, xostream& os) : m_reader(snapshot), m_os(os) {}
+  MapDump(Snapshot& snapshot, xostream& os) : m_reader(snapshot.Objects()), m_os(os) {}
 
   // Whether the map is of this class.
   bool Write(ptr<IPersistable> object) {

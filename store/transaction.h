@@ -111,6 +111,9 @@ class WriteTransaction {
 
   bool IsPoisoned() const noexcept { return m_poisoned; }
 
+  // The objects that the transaction reads and changes.
+  vemo::View& Objects() noexcept { return m_space.m_writerView; }
+
   // Of the host's side:
   static bool IsOpenOnThisThread(const CSpace& space) noexcept;
   static WriteTransaction* OnThisThread() noexcept;

@@ -149,7 +149,7 @@ class SpaceCheck {
     const auto reach = [&](OID oid, const std::string& where) {
       if (!m_reached.Insert(oid)) Find(name, where, oid, "", "the node belongs to two maps");
     };
-    MapCheck<Map, NodeReader> check(map, NodeReader(m_snapshot), reach);
+    MapCheck<Map, NodeReader> check(map, NodeReader(m_snapshot.Objects()), reach);
     for (const MapFinding& finding : check.Run()) {
       const OID oid = finding.oid.IsNull() ? PersistStateOf(object).m_oid : finding.oid;
       std::string className = finding.className;

@@ -145,6 +145,19 @@ ErrorPlace View::Place(OID oid, std::string_view className, std::string_view roo
 
 ptr<IPersistable> View::Find(OID oid) const noexcept { return m_residents.Find(oid); }
 
+ptr<IPersistable> View::InMemory(const prefbase& reference, const IPersistable::FnTable* expected) {
+  ptr<IPersistable> object = reference.m_ptr;
+  if (object.m_self == nullptr) {
+    if (reference.m_ptr.m_table != this) {
+      throw UsageError(m_spaceName + ": the map was not taken from " + UseName() + " that it is to be read with");
+    }
+    const UseCheck::Scope use(m_use, m_spaceName, UseName());
+    object = Find(reference.m_oid);
+  }
+  if (object.m_self != nullptr && object.Table() != expected) RefuseClass(reference.m_oid, object.Table(), expected);
+  return object;
+}
+
 void View::Own(ptr<IPersistable> object, OID oid) noexcept {
   ObjSysState& state = SysStateOf(object);
   state.m_cspace = &m_space;
@@ -175,16 +188,10 @@ ptr<IPersistable> View::Resolve(OID oid, const IPersistable::FnTable* expected) 
   const UseCheck::Scope use(m_use, m_spaceName, UseName());
   ptr<IPersistable> object = m_residents.Use(oid);
   if (object.m_self == nullptr) {
-    const std::optional<ByteView> record = State().Read(oid);
-    if (!record) {
-      const std::string_view className = NameOf(expected);
-      throw DanglingReference(
-          Describe(oid, className, "it is referred to, but there is no record of it (run vemo verify)"),
-          Place(oid, className));
-    }
-    object = Decode(oid, *record, expected);
+    const ByteView record = RequireRecord(oid, expected);
+    object = Decode(oid, record, expected);
     try {
-      Adopt(oid, object, CommitOfRecord(*record));
+      Adopt(oid, object, CommitOfRecord(record));
     } catch (...) {
       DestroyObject(object);
       throw;
@@ -193,6 +200,35 @@ ptr<IPersistable> View::Resolve(OID oid, const IPersistable::FnTable* expected) 
   }
   if (expected != nullptr && object.Table() != expected) RefuseClass(oid, object.Table(), expected);
   return object;
+}
+
+ByteView View::RequireRecord(OID oid, const IPersistable::FnTable* expected) const {
+  if (const std::optional<ByteView> record = State().Read(oid)) return *record;
+  const std::string_view className = NameOf(expected);
+  throw DanglingReference(Describe(oid, className, "it is referred to, but there is no record of it (run vemo verify)"),
+                          Place(oid, className));
+}
+
+ByteView View::ReadStored(OID oid, const IPersistable::FnTable* expected) {
+  const UseCheck::Scope use(m_use, m_spaceName, UseName());
+  try {
+    const RecordEnvelope envelope = OpenRecord(RequireRecord(oid, expected), oid);
+    const IPersistable::FnTable* found = ClassOf(oid, envelope.classNumber, expected).table;
+    if (found != expected) RefuseClass(oid, found, expected);
+    return envelope.body;
+  } catch (const MalformedBytes& malformed) {
+    RefuseForm(oid, expected, malformed);
+  }
+}
+
+void View::RefuseForm(OID oid, const IPersistable::FnTable* expected, const MalformedBytes& fault) const {
+  RefuseForm(oid, NameOf(expected), fault);
+}
+
+void View::RefuseForm(OID oid, std::string_view className, const MalformedBytes& fault) const {
+  ErrorPlace place = Place(oid, className);
+  place.offset = fault.offset();
+  throw CorruptRecord(Describe(oid, className, fault.what()), std::move(place));
 }
 
 void View::RefuseClass(OID oid, const IPersistable::FnTable* found, const IPersistable::FnTable* expected) const {
@@ -219,10 +255,7 @@ ptr<IPersistable> View::Decode(OID oid, ByteView record, const IPersistable::FnT
     return object;
   } catch (const MalformedBytes& malformed) {
     if (object.m_self != nullptr) DestroyObject(object);
-    if (className.empty()) className = NameOf(expected);
-    ErrorPlace place = Place(oid, className);
-    place.offset = malformed.offset();
-    throw CorruptRecord(Describe(oid, className, malformed.what()), std::move(place));
+    RefuseForm(oid, className.empty() ? NameOf(expected) : className, malformed);
   } catch (...) {
     if (object.m_self != nullptr) DestroyObject(object);
     throw;

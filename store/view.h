@@ -28,6 +28,7 @@
 #include <string_view>
 #include <vector>
 
+#include "platform/error.h"
 #include "store/class_numbers.h"
 #include "store/class_registry.h"
 #include "store/engine.h"
@@ -70,6 +71,14 @@ class View {
   // table is not `expected` (null: any of the nine classes).
   ptr<IPersistable> Resolve(OID oid, const IPersistable::FnTable* expected);
 
+  // The record of the object `oid`, which should be of the table `expected`. Throws DanglingReference where there is none.
+  ByteView RequireRecord(OID oid, const IPersistable::FnTable* expected) const;
+  // The body of the stored object `oid`, which must be of the table `expected`: for whoever reads it without having the object made.
+  // Valid until the view reads again. Throws as Resolve, but looks at what stands around the body alone.
+  ByteView ReadStored(OID oid, const IPersistable::FnTable* expected);
+  // Throws CorruptRecord: what ReadStored returned is not the form of such an object.
+  [[noreturn]] void RefuseForm(OID oid, const IPersistable::FnTable* expected, const MalformedBytes& fault) const;
+
   // Throws CorruptRecord: the object's table is `found`, which is not `expected`.
   [[noreturn]] void RefuseClass(OID oid, const IPersistable::FnTable* found, const IPersistable::FnTable* expected) const;
 
@@ -86,6 +95,9 @@ class View {
 
   // The resident `oid`, or null.
   ptr<IPersistable> Find(OID oid) const noexcept;
+  // The object behind a reference that is not empty where it is in memory, or null: for whoever looks at it and goes. Throws
+  // CorruptRecord where it is of another table than `expected`, and UsageError where the reference was read in another view.
+  ptr<IPersistable> InMemory(const prefbase& reference, const IPersistable::FnTable* expected);
   // Whether the object of that id and address is a resident or a root map. Unlike the rest, for any thread.
   bool Holds(OID oid, const void* self) const;
   // Takes an object in; `commit` is the one that wrote its record, 0 for a new one.
@@ -124,6 +136,7 @@ class View {
   ErrorPlace Place(OID oid, std::string_view className = "", std::string_view root = "") const;
 
  private:
+  [[noreturn]] void RefuseForm(OID oid, std::string_view className, const MalformedBytes& fault) const;
   const ClassEntry& ClassOf(OID oid, std::uint32_t number, const IPersistable::FnTable* expected) const;
   void ReadBody(ptr<IPersistable> object, ByteView body);
   // Takes all references of the view to these objects back to the unbound state.

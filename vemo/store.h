@@ -2,6 +2,7 @@
 // is larger than memory.
 #pragma once
 
+#include "store/peek.h"         // IWYU pragma: export
 #include "store/scan.h"         // IWYU pragma: export
 #include "store/scope.h"        // IWYU pragma: export
 #include "store/snapshot.h"     // IWYU pragma: export

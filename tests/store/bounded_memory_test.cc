@@ -78,6 +78,20 @@ TEST_P(BoundedMemoryTest, AScanOfASnapshotVisitsEverythingInOrder) {
   EXPECT_EQ(last, kKeysOfLargeMap);
 }
 
+TEST_P(BoundedMemoryTest, AScanWhoseVisitorLooksThingsUpTrimsBetweenLeaves) {
+  MakeLargeMap();
+  Snapshot snapshot(space());
+  const auto& map = snapshot.Root<TombstonesMap>("t");
+  std::uint64_t mostBytes = 0;
+  EXPECT_TRUE(ScanMap(snapshot, map, FieldId(), [&](const FieldId& key, const auto&) {
+    if (NumberOf(key) % 10 == 0) map.rFind(Key(kKeysOfLargeMap + 1 - NumberOf(key)));
+    mostBytes = std::max(mostBytes, ResidentBytes());
+    return true;
+  }));
+  EXPECT_LE(mostBytes, kCacheBytes / 2 + kOperationBytes);
+  EXPECT_GT(space().CacheStatistics().evictions, 0u);
+}
+
 TEST_P(BoundedMemoryTest, AScanOfATransactionSeesItsChangesAndKeepsThem) {
   MakeLargeMap();
   WriteTransaction transaction(space());

@@ -2,6 +2,7 @@
 #include "platform/variable_length.h"
 #include "store/envelope.h"
 #include "store/root_value.h"
+#include "store/scan.h"
 #include "tests/store/store_fixture.h"
 
 namespace vemo::test {
@@ -63,7 +64,7 @@ class ForgedRecordTest : public StoreTest {
     Forge(oid, site.ClassNumber(className), body);
   }
 
-  // The message on reading map "t"; another root stays readable. The record is put back.
+  // The message on reading map "t", whether or not what is read is kept; another root stays readable. The record is put back.
   std::string MessageFor(OID oid) {
     Snapshot snapshot(space());
     std::string message;
@@ -75,6 +76,11 @@ class ForgedRecordTest : public StoreTest {
       message = corrupt.what();
       EXPECT_NE(message.find("object " + std::to_string(oid.m_value)), std::string::npos) << message;
     }
+    EXPECT_EQ(MessageOf<CorruptRecord>([&] {
+                Snapshot another(space());  // which has nothing in memory
+                ScanMap(another, another.Root<TombstonesMap>("t"), FieldId(), [](const FieldId&, const auto&) { return true; });
+              }),
+              message);
     EXPECT_EQ(FaultsOf(snapshot.Root<InsertionsMap>("i")), "");
     site.Tamper(oid, m_stored.records.at(oid));
     return message;

@@ -3,6 +3,7 @@
 #include <optional>
 #include <random>
 
+#include "store/peek.h"
 #include "store/scan.h"
 #include "store/verify.h"
 #include "tests/store/store_fixture.h"
@@ -62,13 +63,17 @@ class ModelledRoot {
     AfterOperation();
   }
 
-  void CheckOpen() const { EXPECT_EQ(Scanned(*m_transaction, *m_map), m_now) << m_name; }
-  void CheckCommitted(Snapshot& snapshot) const {
+  void CheckOpen(std::mt19937_64& random) const {
+    EXPECT_EQ(Scanned(*m_transaction, *m_map), m_now) << m_name;
+    CheckPeeks(*m_transaction, *m_map, m_now, random);
+  }
+  void CheckCommitted(Snapshot& snapshot, std::mt19937_64& random) const {
     if (!snapshot.HasRoot(m_name)) {
       EXPECT_TRUE(m_committed.empty());
       return;
     }
     EXPECT_EQ(Scanned(snapshot, snapshot.Root<Map>(m_name)), m_committed) << m_name;
+    CheckPeeks(snapshot, snapshot.Root<Map>(m_name), m_committed, random);
     EXPECT_EQ(NumbersOf(snapshot.Root<Map>(m_name)), m_committed) << m_name;
     if (m_evicts) snapshot.TrimTo(0);
     EXPECT_EQ(FaultsOf(snapshot.Root<Map>(m_name)), "") << m_name;
@@ -90,6 +95,19 @@ class ModelledRoot {
       return true;
     });
     return numbers;
+  }
+
+  template <class Owner>
+  static void CheckPeeks(Owner& owner, const Map& map, const std::map<std::uint64_t, std::uint64_t>& model,
+                         std::mt19937_64& random) {
+    for (int i = 0; i < 50; ++i) {
+      const std::uint64_t n = 1 + random() % kKeys;
+      const auto payload = PeekMap(owner, map, Key(n));
+      ASSERT_EQ(payload.has_value(), model.contains(n)) << n;
+      if (payload) {
+        EXPECT_EQ(PayloadNumber<typename Map::Payload>::Number(*payload), model.at(n));
+      }
+    }
   }
 
   std::string m_name;
@@ -121,7 +139,7 @@ TEST_P(RandomStoreTest, MapsStayWhatTheirModelsAre) {
         if (map == 1) histories.Change(random);
         if (map >= 2) tombstones.Change(random);
       }
-      if (random() % 4 == 0) tombstones.CheckOpen();
+      if (random() % 4 == 0) tombstones.CheckOpen(random);
       if (random() % 3 != 0) {
         transaction.Commit();
         insertions.Committed();
@@ -132,9 +150,9 @@ TEST_P(RandomStoreTest, MapsStayWhatTheirModelsAre) {
     if (random() % 6 == 0) site.Reopen();
     if (random() % 4 != 0) continue;
     Snapshot snapshot(space());
-    insertions.CheckCommitted(snapshot);
-    tombstones.CheckCommitted(snapshot);
-    histories.CheckCommitted(snapshot);
+    insertions.CheckCommitted(snapshot, random);
+    tombstones.CheckCommitted(snapshot, random);
+    histories.CheckCommitted(snapshot, random);
   }
   Snapshot snapshot(space());
   const VerifyReport report = VerifySpace(snapshot);

@@ -1,5 +1,6 @@
 #include "tests/store/watched_engine.h"
 
+#include <algorithm>
 #include <utility>
 
 namespace vemo::test {
@@ -15,7 +16,12 @@ class WatchedSnapshot final : public EngineSnapshot {
   std::optional<ByteView> Read(OID oid) const override {
     m_watch.failingRead.Pass("Read");
     ++m_watch.reads;
-    return m_inner->Read(oid);
+    // A copy that is spoilt by the next call, as the engine may do: whoever still reads it then is found out.
+    std::fill(m_record.begin(), m_record.end(), std::uint8_t{0xDD});
+    const std::optional<ByteView> record = m_inner->Read(oid);
+    if (!record) return std::nullopt;
+    m_record = Bytes(record->begin(), record->end());
+    return m_record;
   }
   void ScanRecords(OID first, const std::function<bool(OID, ByteView)>& visit) const override {
     m_inner->ScanRecords(first, visit);
@@ -35,6 +41,7 @@ class WatchedSnapshot final : public EngineSnapshot {
  private:
   std::unique_ptr<EngineSnapshot> m_inner;
   EngineWatch& m_watch;
+  mutable Bytes m_record;
 };
 
 class WatchedEngine final : public Engine {
