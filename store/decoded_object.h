@@ -39,7 +39,8 @@ class NodeReader {
  public:
   explicit NodeReader(View& view) noexcept : m_view(view) {}
 
-  // The node behind a reference that is not empty, as it is stored. Throws CorruptRecord where it is of another class than `expected`.
+  // The node behind a reference that is not empty, as it is stored. Throws CorruptRecord where it is of another class than
+  // `expected`.
   DecodedObject Read(const prefbase& reference, const IPersistable::FnTable* expected) const {
     DecodedObject object(m_view.Decode(reference.m_oid, m_view.RequireRecord(reference.m_oid, expected), expected));
     if (object.Get().Table() != expected) m_view.RefuseClass(reference.m_oid, object.Get().Table(), expected);

@@ -17,21 +17,16 @@ namespace vemo {
 // than rFind in a leaf that is there.
 template <class Owner, class Traits>
 std::optional<typename Traits::Payload> PeekMap(Owner& owner, const TFieldMap<Traits>& map, const FieldId& key) {
-  using InternalNode = typename Traits::InternalNode;
   using LeafNode = typename Traits::LeafNode;
   if (map.m_height < 0) return std::nullopt;
-  const cref<void>* reference = &map.m_root;
-  for (ssize_t height = map.m_height; height > 0; --height) {
-    const auto* node = static_cast<const InternalNode*>(reference->GetAs(IPersistable::Stubs<InternalNode>::GetTable()));
-    reference = &node->ChildReference(node->FindChildIndexGivenKey(key));
-  }
+  const prefbase& reference = LeafReferenceFor(map, key);
   View& view = owner.Objects();
-  if (const ptr<IPersistable> object = view.InMemory(*reference, StoredLeaf<Traits>::Table()); object.m_self != nullptr) {
+  if (const ptr<IPersistable> object = view.InMemory(reference, StoredLeaf<Traits>::Table()); object.m_self != nullptr) {
     const auto& leaf = *static_cast<const LeafNode*>(object.m_self);
     const ssize_t i = map.SearchLeaf(key, &leaf);
     return i < 0 ? std::nullopt : std::optional(leaf.GetEntry(i).second);
   }
-  StoredLeaf<Traits> entries(view, reference->m_oid, view.ReadStored(reference->m_oid, StoredLeaf<Traits>::Table()));
+  StoredLeaf<Traits> entries(view, reference.m_oid, view.ReadStored(reference.m_oid, StoredLeaf<Traits>::Table()));
   while (entries.NextKey()) {
     const int order = entries.CompareKeyWith(key);
     if (order > 0) break;

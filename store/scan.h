@@ -17,11 +17,12 @@ class MapScan {
       : m_owner(owner), m_view(owner.Objects()), m_map(map), m_visit(visit) {}
 
   bool Run(const FieldId& from) {
+    if (m_map.m_height < 0) return true;
     m_from = from;
-    LoadWayTo(from);
+    LeafReferenceFor(m_map, from);  // loads the way, for the next scan that begins near by
     for (;;) {
       m_isOnTheWay = true;
-      switch (m_map.m_height < 0 ? Outcome::kEnd : Walk(m_map.m_root, m_map.m_height)) {
+      switch (Walk(m_map.m_root, m_map.m_height)) {
         case Outcome::kEnd: return true;
         case Outcome::kStopped: return false;
         case Outcome::kOverAllowance: m_owner.Trim();
@@ -33,15 +34,6 @@ class MapScan {
   using InternalNode = typename Traits::InternalNode;
   using LeafNode = typename Traits::LeafNode;
   enum class Outcome { kEnd, kStopped, kOverAllowance };
-
-  // For the next scan that begins near by.
-  void LoadWayTo(const FieldId& key) {
-    const cref<void>* reference = &m_map.m_root;
-    for (ssize_t height = m_map.m_height; height > 0; --height) {
-      const auto* node = static_cast<const InternalNode*>(reference->GetAs(IPersistable::Stubs<InternalNode>::GetTable()));
-      reference = &node->ChildReference(node->FindChildIndexGivenKey(key));
-    }
-  }
 
   Outcome Walk(const prefbase& reference, ssize_t height) {
     return height > 0 ? WalkInternalNode(reference, height) : WalkLeaf(reference);
@@ -128,16 +120,16 @@ class MapScan {
 // Calls `visit(key, payload)` for each entry of `map` from the key `from` on, in ascending order, until it returns false.
 // Returns whether the end of the map was reached. `owner` is the Snapshot or WriteTransaction that the map was taken from.
 //
-// Nodes that are in memory are used, others are read and not kept, but for the internal ones on the way to `from`: what it takes is
-// two paths from the root, however large the map and whatever SpaceOptions::cacheBytes says. References that `visit` was given end
-// with that call of it. `visit` may look things up in maps of the same owner; where the owner has more in memory than its share of
-// cacheBytes, it is trimmed between two leaves, and what Trim ends, a call of this ends too. So a map on the stack that has taken
-// over nodes of the space must not be scanned where there is a budget. `visit` must neither trim, refresh nor end the owner, nor scan
-// another of its maps, and not change this one.
+// Nodes that are in memory are used, others are read and not kept, but for the internal ones on the way to `from`: what it takes
+// is two paths from the root, however large the map and whatever SpaceOptions::cacheBytes says. References that `visit` was
+// given end with that call of it. `visit` may look things up in maps of the same owner; where the owner has more in memory than
+// its share of cacheBytes, it is trimmed between two leaves, and what Trim ends, a call of this ends too. So a map on the stack
+// that has taken over nodes of the space must not be scanned where there is a budget. `visit` must neither trim, refresh nor end
+// the owner, nor scan another of its maps, and not change this one.
 // Throws UsageError where the map is not the owner's, and what following references throws; of a damaged leaf that its checksum
 // vouches for, entries before the damage are visited.
-// Costs reading each leaf that is not in memory, and a step for each entry: a map that fits into memory and is walked again and again
-// is walked faster by its iterators, which load it.
+// Costs reading each leaf that is not in memory, and a step for each entry: a map that fits into memory and is walked again and
+// again is walked faster by its iterators, which load it.
 template <class Owner, class Traits, class Visit>
 bool ScanMap(Owner& owner, const TFieldMap<Traits>& map, const FieldId& from, Visit&& visit) {
   return MapScan<Owner, Traits, Visit>(owner, map, visit).Run(from);

@@ -1,4 +1,4 @@
-// The entries of a leaf as they are stored, read one by one without making the node.
+// Leaves that are read without making the node.
 #pragma once
 
 #include "platform/error.h"
@@ -8,11 +8,25 @@
 
 namespace vemo {
 
-// Throws CorruptRecord for what is not the form of such a leaf, when it gets there.
+// The reference to the leaf in whose range `key` is, of a map that has nodes. Loads the internal nodes on the way.
+template <class Traits>
+const prefbase& LeafReferenceFor(const TFieldMap<Traits>& map, const FieldId& key) {
+  using InternalNode = typename Traits::InternalNode;
+  const cref<void>* reference = &map.m_root;
+  for (ssize_t height = map.m_height; height > 0; --height) {
+    const auto* node = static_cast<const InternalNode*>(reference->GetAs(IPersistable::Stubs<InternalNode>::GetTable()));
+    reference = &node->ChildReference(node->FindChildIndexGivenKey(key));
+  }
+  return *reference;
+}
+
+// The entries of a leaf as they are stored, one by one. Throws CorruptRecord for what is not the form of such a leaf, when it gets there.
 template <class Traits>
 class StoredLeaf {
  public:
-  static const IPersistable::FnTable* Table() noexcept { return IPersistable::Stubs<typename Traits::LeafNode>::GetTable(); }
+  static const IPersistable::FnTable* Table() noexcept {
+    return IPersistable::Stubs<typename Traits::LeafNode>::GetTable();
+  }
 
   // `body` is what View::ReadStored has returned for the leaf `oid`, or a copy, and must live as long.
   StoredLeaf(const View& view, OID oid, ByteView body)
