@@ -15,6 +15,9 @@ namespace {
 
 // A delta may be that long whatever the record's size: the record of a map changes with every entry that comes or goes.
 constexpr std::size_t kAlwaysShortBytes = 64;
+// Where all of a small commit are deltas, it goes to the log and waits for one flush instead of two: they may be longer there.
+constexpr std::size_t kFewRecords = 8;
+constexpr std::size_t kShortForTheLogBytes = 1024;
 // The load, of which 1 is the bound, at which a round begins, and how much may come on top until it ends.
 constexpr double kRoundBegins = 0.5;
 constexpr double kRoundAdds = 0.4;
@@ -53,6 +56,7 @@ void RecordWriter::Write(const CommitBatch& batch) {
   if (m_index.HasDamage() || m_tail.HasDamage(m_commit)) {
     m_writer.FailChanges("the changes of a commit are damaged, so that nothing may be written");
   }
+  m_isSmall = batch.records.size() <= kFewRecords;
   for (const OID oid : batch.removedRecords) m_writer.RemoveRecord(oid);
   // In the order of ids, so that neighbours are written while their page is at hand.
   std::vector<const CommitBatch::Record*> sorted;
@@ -100,7 +104,7 @@ bool RecordWriter::TryLog(const CommitBatch& batch, const ChangeIndex::Load& add
 void RecordWriter::WriteRecord(const CommitBatch::Record& record, ChangeBlobBuilder& changes) {
   const bool isTooMuch = changes.bytes() > m_bounds.bytes / 2 || changes.count() > m_bounds.records / 2;
   if (const auto stored = isTooMuch ? std::nullopt : m_writer.Stored(record.oid)) {
-    const std::size_t mostBytes = std::max(record.bytes.size() / 2, kAlwaysShortBytes);
+    const std::size_t mostBytes = std::max(record.bytes.size() / 2, m_isSmall ? kShortForTheLogBytes : kAlwaysShortBytes);
     if (const std::optional<Bytes> delta = RecordDelta(stored->record, record.bytes, mostBytes)) {
       changes.Add(record.oid, *delta);
       return;

@@ -57,6 +57,7 @@ class RecordWriter {
   const std::uint64_t m_commit;
   const LogTail& m_tail;
   ChangesRange m_kept;  // of all changes once the commit is made, those of the log among them
+  bool m_isSmall = false;
   bool m_hasWhole = false;  // records are written as a whole
   Bytes m_changed;          // the record that is being settled
 };

@@ -423,8 +423,24 @@ TEST_F(CommitLogs, HaveNoOtherKindsOfCommits) {
   expectTables("names", BatchBuilder().Name(NamedTable::kRoots, "root", "value"));
   m_expected.erase(9);
   expectTables("removes", BatchBuilder().Remove(9));
-  m_expected[8] = std::string(500, 'Q');
-  expectTables("replaces", BatchBuilder().Put(8, m_expected[8]));
+  m_expected[8] = std::string(3'000, 'Q');
+  expectTables("replaces much", BatchBuilder().Put(8, m_expected[8]));
+  BatchBuilder many;
+  for (std::uint64_t oid = 10; oid <= 18; ++oid) many.Put(oid, m_expected[oid] = std::string(500, 'Q'));
+  expectTables("replaces many", many);
+  ExpectAll();
+}
+
+TEST_F(CommitLogs, TakeRecordsThatAreReplacedWhereTheyAreFewAndShort) {
+  Edit(1);
+  const std::string data = ReadFile(file(kDataFile));
+  BatchBuilder batch;
+  for (std::uint64_t oid = 10; oid <= 17; ++oid) batch.Put(oid, m_expected[oid] = std::string(500, 'Q'));
+  Commit(batch);
+  EXPECT_TRUE(ReadFile(file(kDataFile)) == data);
+  ExpectAll();
+  Close();
+  Open();
   ExpectAll();
 }
 
