@@ -86,6 +86,7 @@ def main():
         sys.exit("No row fits; the programs in build/bench list theirs with --list.")
     rounds = arguments.rounds or matrix.ROUNDS[arguments.mode]
 
+    revision = report.current_revision()  # of what was built, whatever is checked out meanwhile
     start = time.monotonic()
     samples = {}
     failed = set()
@@ -114,7 +115,7 @@ def main():
 
     results = report.summarise(samples)
     command = shlex.join(["bench/run", *sys.argv[1:]]).replace(f" --build {shlex.quote(arguments.build)}", "")
-    text = report.markdown(results, command, done, time.monotonic() - start)
+    text = report.markdown(results, command, revision, done, time.monotonic() - start)
     print(text)
     if arguments.markdown:
         report.write_markdown(arguments.markdown, text)

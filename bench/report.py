@@ -73,7 +73,7 @@ def processor():
         return "unknown processor"
 
 
-def revision():
+def current_revision():
     found = subprocess.run(["git", "describe", "--always", "--dirty"], capture_output=True, text=True)
     return found.stdout.strip() or "unknown"
 
@@ -90,10 +90,11 @@ def write_markdown(path, text):
         file.write(f"{before}{begin}\n\n{text}\n\n{end}{after}" if begin and end else text + "\n")
 
 
-def markdown(results, command, rounds, seconds):
+def markdown(results, command, revision, rounds, seconds):
     """A table for each group of rows that the same peers took part in."""
-    lines = [f"`{command}`, {datetime.date.today()}, {processor()}, revision {revision()}; {rounds} rounds in "
-             f"{seconds:,.0f} s. Median (least to most); the ratio is ours to the best peer, below 1 where vemo is better."]
+    runs = "1 round" if rounds == 1 else f"{rounds} rounds"
+    lines = [f"`{command}`, {datetime.date.today()}, {processor()}, revision {revision}; {runs} in {seconds:,.0f} s. "
+             "Median (least to most); the ratio is ours to the best peer, below 1 where vemo is better."]
     header = None
     for key, row in by_row(results).items():
         group = key[0].split(".")[0]
